@@ -1,0 +1,5 @@
+qivo_test(test-platform-base SOURCES LogTest.cpp ResourcesTest.cpp LocalFileTest.cpp LIBRARIES qivo_platform_base TSAN)
+if(TARGET test-platform-base)
+    add_dependencies(test-platform-base qivo_shaders)
+endif()
+qivo_test(test-platform-image SOURCES ImageTest.cpp ImageDecodingTest.cpp LIBRARIES qivo_platform_image Qt6::Gui)
