@@ -1,0 +1,55 @@
+#pragma once
+
+#include "app/AppDelegate.h"
+
+#include <QList>
+#include <QObject>
+
+#include <memory>
+
+namespace Ui {
+class MainWindow;
+} // namespace Ui
+
+namespace qivo {
+
+class MainWindow;
+class ViewController;
+class WindowController;
+
+/// Everything that the interface files describe, made and connected: the application's controller, then the menus, the
+/// main window with its controllers and the switches of its title bar. The controller is made first and goes last,
+/// because it holds the QIVO library.
+///
+/// Thread: main.
+class Interface : public QObject {
+    Q_OBJECT
+
+  public:
+    Interface();
+    ~Interface() override;
+
+    AppDelegate& delegate() { return *m_delegate; }
+    MainWindow& window() { return *m_window; }
+    WindowController& windowController() { return *m_windowController; }
+    ViewController& viewController() { return *m_viewController; }
+
+    /// Enables and disables a menu's commands as the controller says. Entries without a command stay as they are.
+    void validateMenu(QMenu* menu) const;
+
+  private:
+    void loadMenus();
+    void loadTitleBar();
+    void takeTags();
+    void addCommand(QAction* item, void (AppDelegate::*command)());
+    void validateAllMenus() const;
+
+    std::unique_ptr<AppDelegate> m_delegate;
+    std::unique_ptr<Ui::MainWindow> m_ui;
+    std::unique_ptr<MainWindow> m_window;
+    std::unique_ptr<ViewController> m_viewController;
+    std::unique_ptr<WindowController> m_windowController;
+    QList<QAction*> m_commands; // the window's
+};
+
+} // namespace qivo

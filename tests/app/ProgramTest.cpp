@@ -1,0 +1,158 @@
+// The program itself, as a user starts and ends it.
+
+#include "tests/platform/TemporaryDirectory.h"
+#include "tests/support/Process.h"
+#include "tests/support/Screen.h"
+
+#include <csignal>
+#include <filesystem>
+#include <fstream>
+#include <gmock/gmock.h>
+#include <iterator>
+
+namespace qivo {
+namespace {
+
+using test::eventually;
+using test::Process;
+using test::Screen;
+using testing::AllOf;
+using testing::HasSubstr;
+using testing::Not;
+
+constexpr auto kSoon = std::chrono::seconds(20);
+
+class ProgramTest : public testing::Test {
+  protected:
+    void SetUp() override {
+        // Alone in its folder, so that no libqivo is beside it; the dynamic linker finds one only where a test says.
+        std::filesystem::create_directory(folder.path("bin"));
+        std::filesystem::copy_file(VIEWER, viewer());
+        screen = Screen::open();
+        ASSERT_TRUE(screen);
+    }
+
+    std::string viewer() const { return folder.path("bin/qivo-viewer"); }
+    std::string preferences() const { return folder.path("Orvane/QIVO Viewer.conf"); }
+
+    std::unique_ptr<Process> start(std::vector<std::string> environment = {}) const {
+        environment.push_back("XDG_CONFIG_HOME=" + folder.path());
+        environment.emplace_back("HOME=" + folder.path());
+        return Process::start({viewer()}, environment);
+    }
+
+    std::unique_ptr<Process> startWithLibrary() const {
+        return start({std::string("LD_LIBRARY_PATH=") + STAND_INS + "/complete"});
+    }
+
+    bool waitForWindow() const {
+        return eventually([&] { return screen->findWindow("QIVO Viewer").has_value(); });
+    }
+
+    std::string saved() const {
+        std::ifstream file(preferences());
+        return {std::istreambuf_iterator<char>(file), {}};
+    }
+
+    TemporaryDirectory folder;
+    std::unique_ptr<Screen> screen;
+};
+
+TEST_F(ProgramTest, ClosingTheWindowEndsItAndSavesTheSettings) {
+    std::filesystem::create_directory(folder.path("Orvane"));
+    folder.write("Orvane/QIVO Viewer.conf", "[General]\nORVQIVOViewer_isLowBandwith=true\n");
+    const auto program = startWithLibrary();
+    ASSERT_TRUE(waitForWindow());
+    EXPECT_TRUE(program->waitForOutput("stand-in: initialize\n"));
+    screen->close(*screen->findWindow("QIVO Viewer"));
+    EXPECT_EQ(program->wait(kSoon), 0);
+    EXPECT_EQ(program->output(), "stand-in: initialize\nstand-in: destroy\n");
+    EXPECT_EQ(saved(), "[General]\nORVQIVOViewer_isLowBandwith=true\nORVQIVOViewer_mute=false\n"
+                       "ORVQIVOViewer_recordFolder=" +
+                           folder.path() + "\n");
+}
+
+TEST_F(ProgramTest, QuitByKeyEndsItWithSuccess) {
+    const auto program = startWithLibrary();
+    ASSERT_TRUE(waitForWindow());
+    screen->activate(*screen->findWindow("QIVO Viewer"));
+    EXPECT_TRUE(eventually([&] { return screen->key("Control+q") && !program->running(); }));
+    EXPECT_EQ(program->wait(kSoon), 0);
+    EXPECT_THAT(saved(), HasSubstr("ORVQIVOViewer_mute=false"));
+}
+
+TEST_F(ProgramTest, SignalEndsItInItsUsualOrder) {
+    for (const int signal : {SIGTERM, SIGINT, SIGHUP}) {
+        std::filesystem::remove(preferences());
+        const auto program = startWithLibrary();
+        ASSERT_TRUE(waitForWindow());
+        program->signal(signal);
+        EXPECT_EQ(program->wait(kSoon), 0);
+        EXPECT_THAT(saved(), HasSubstr("ORVQIVOViewer_recordFolder=" + folder.path()));
+    }
+}
+
+TEST_F(ProgramTest, WithoutLibqivoItSaysSoAndShowsItsWindow) {
+    const auto program = start();
+    ASSERT_TRUE(waitForWindow());
+    EXPECT_EQ(program->output(), "Cannot run QIVO.");
+    EXPECT_TRUE(eventually([&] { return !program->errors().empty(); }));
+    EXPECT_THAT(program->errors(),
+                AllOf(HasSubstr("libqivo cannot be used: libqivo.so: cannot open"), HasSubstr("qivo-viewer[")));
+    program->signal(SIGTERM);
+    EXPECT_EQ(program->wait(kSoon), 0);
+}
+
+TEST_F(ProgramTest, LibqivoThatLacksAnOperationIsNamed) {
+    const auto program = start({std::string("LD_LIBRARY_PATH=") + STAND_INS + "/incomplete"});
+    ASSERT_TRUE(waitForWindow());
+    EXPECT_EQ(program->output(), "Cannot run QIVO.");
+    EXPECT_TRUE(eventually([&] { return program->errors().find("lacks the operation QIVOlib_") != std::string::npos; }))
+        << program->errors();
+    program->signal(SIGTERM);
+    EXPECT_EQ(program->wait(kSoon), 0);
+}
+
+TEST_F(ProgramTest, WithoutDisplayItEndsWithOneLine) {
+    for (const auto& [variable, said] : std::vector<std::pair<std::string, std::string>>{
+             {"DISPLAY=", "neither DISPLAY nor WAYLAND_DISPLAY is set"},
+             {"DISPLAY=:4711", "DISPLAY is \":4711\""},
+             {"QT_QPA_PLATFORM=nonsense", "QT_QPA_PLATFORM is \"nonsense\""}}) {
+        std::vector<std::string> environment{variable};
+        if (variable.rfind("QT_", 0) != 0) {
+            environment.emplace_back("QT_QPA_PLATFORM=");
+        }
+        const auto program = start(environment);
+        EXPECT_EQ(program->wait(kSoon), 1);
+        EXPECT_TRUE(eventually([&] { return !program->errors().empty(); }));
+        EXPECT_EQ(program->errors(), "QIVO Viewer cannot open a display: " + said + ".\n");
+        EXPECT_EQ(program->output(), "");
+    }
+}
+
+TEST_F(ProgramTest, DamagedPreferencesAreReportedAndKept) {
+    std::filesystem::create_directory(folder.path("Orvane"));
+    const std::string damaged = "[General]\nORVQIVOViewer_mute=true\n\x01\xff\n";
+    folder.write("Orvane/QIVO Viewer.conf", damaged);
+    const auto program = startWithLibrary();
+    ASSERT_TRUE(waitForWindow());
+    EXPECT_THAT(program->errors(), HasSubstr("is damaged"));
+    program->signal(SIGTERM);
+    EXPECT_EQ(program->wait(kSoon), 0);
+    EXPECT_THAT(saved(), HasSubstr("ORVQIVOViewer_mute=true"));
+    std::ifstream copy(preferences() + ".damaged", std::ios::binary);
+    EXPECT_EQ(std::string(std::istreambuf_iterator<char>(copy), {}), damaged);
+}
+
+TEST_F(ProgramTest, KnowsOfTheNetworkOnlyThroughLibqivo) {
+    const auto program = startWithLibrary();
+    ASSERT_TRUE(waitForWindow());
+    std::ifstream maps("/proc/" + std::to_string(program->pid()) + "/maps");
+    const std::string mapped(std::istreambuf_iterator<char>(maps), {});
+    EXPECT_THAT(mapped, AllOf(HasSubstr("libqivo.so"), Not(HasSubstr("libgstreamer")), Not(HasSubstr("libavahi"))));
+    program->signal(SIGTERM);
+    EXPECT_EQ(program->wait(kSoon), 0);
+}
+
+} // namespace
+} // namespace qivo
