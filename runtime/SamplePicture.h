@@ -1,0 +1,32 @@
+#pragma once
+
+#include "runtime/GstHandles.h"
+#include "runtime/Mailbox.h"
+
+#include <gst/video/video.h>
+
+#include <cstdint>
+
+namespace qivo::runtime {
+
+/// A decoded and converted picture, in the buffer that the conversion wrote.
+class SamplePicture final : public Picture {
+  public:
+    /// Null if the sample is no RGBA picture that can be read. `arrived` is in units of 100 ns since the Unix epoch.
+    static std::unique_ptr<Picture> map(GstOwned<GstSample> sample, std::int64_t arrived);
+
+    SamplePicture(const SamplePicture&) = delete;
+    SamplePicture& operator=(const SamplePicture&) = delete;
+    ~SamplePicture() override;
+
+    QIVOlib_video_frame_v2_t record() const override { return m_record; }
+
+  private:
+    SamplePicture() = default;
+
+    GstOwned<GstSample> m_sample;
+    GstVideoFrame m_frame{};
+    QIVOlib_video_frame_v2_t m_record{};
+};
+
+} // namespace qivo::runtime

@@ -1,0 +1,39 @@
+#pragma once
+
+#include "runtime/GstHandles.h"
+#include "runtime/SoundCutter.h"
+
+#include <atomic>
+#include <functional>
+#include <memory>
+#include <string>
+
+namespace qivo::runtime {
+
+/// What takes a stream of sound from its packets to frames. Lives as long as the bin that it was built in, at least
+/// until that is in its null state.
+///
+/// Thread: built on the source's thread; calls on the network's.
+class SoundBranch {
+  public:
+    struct Calls {
+        std::function<void(std::unique_ptr<Sound>)> emit;
+        std::function<void()> unitComplete;       ///< what the packets began is whole
+        std::function<void(std::string)> refused; ///< the sound turned out to be none that is received, and why
+    };
+
+    explicit SoundBranch(Calls calls);
+
+    /// Builds everything behind the pad. False if an element is missing. The encoding is one that has a codec.
+    bool build(GstBin* bin, GstPad* pad, const std::string& encoding);
+
+  private:
+    struct Callbacks;
+
+    void take(GstPad* pad, GstBuffer* buffer);
+
+    const Calls m_calls;
+    SoundCutter m_cutter;
+};
+
+} // namespace qivo::runtime
