@@ -1,0 +1,412 @@
+// What a receiver makes of a source's sound.
+
+#include "runtime/SoundCutter.h"
+#include "runtime/SoundQueue.h"
+#include "tests/runtime/RawServer.h"
+#include "tests/runtime/ReceiverFixture.h"
+#include "tests/support/Tone.h"
+
+#include <gmock/gmock.h>
+
+#include <cmath>
+#include <map>
+#include <ostream>
+#include <thread>
+
+namespace qivo::test {
+namespace {
+
+using runtime::Receiver;
+using runtime::SoundCutter;
+using runtime::SoundQueue;
+
+constexpr double kTone = 440.0;
+
+/// How loud each channel is of a source that is made here, so that they can be told apart.
+double levelOf(int channel, int channels) {
+    return 0.5 * (channels - channel) / channels;
+}
+
+/// A live tone with a level of its own on each channel, up to the raw sound.
+std::string tone(int rate, int channels) {
+    const std::map<int, std::string> masks{{1, ""},
+                                           {2, ",channel-mask=(bitmask)0x3"},
+                                           {3, ",channel-mask=(bitmask)0x7"},
+                                           {8, ",channel-mask=(bitmask)0xc3f"}};
+    std::string matrix;
+    for (int channel = 0; channel < channels; ++channel) {
+        const double level = levelOf(channel, channels) / 0.5;
+        matrix += (channel == 0 ? "<(float)" : ",<(float)") + std::to_string(level) + ">";
+    }
+    const std::string caps = "audio/x-raw,rate=" + std::to_string(rate);
+    return "audiotestsrc name=tone is-live=true volume=0.5 freq=440 samplesperbuffer=" + std::to_string(rate / 100) +
+           " ! capsfilter caps=\"" + caps + ",format=F32LE,channels=1\" ! audioconvert mix-matrix=\"<" + matrix +
+           ">\" ! capsfilter caps=\"" + caps + ",channels=" + std::to_string(channels) + masks.at(channels) + "\"";
+}
+
+std::string payloader(const std::string& codec, int number = 0) {
+    const std::string name = " name=pay" + std::to_string(number) + " pt=";
+    const std::map<std::string, std::string> ends{
+        {"L16", "audioconvert dithering=none ! rtpL16pay" + name + "97"},
+        {"L24", "audioconvert dithering=none ! rtpL24pay" + name + "97"},
+        {"PCMU", "audioconvert ! mulawenc ! rtppcmupay" + name + "0"},
+        {"PCMA", "audioconvert ! alawenc ! rtppcmapay" + name + "8"},
+        {"AAC", "audioconvert ! avenc_aac ! aacparse ! rtpmp4gpay" + name + "97"},
+        {"LATM", "audioconvert ! avenc_aac ! aacparse ! rtpmp4apay" + name + "97"},
+        {"OPUS", "audioconvert ! opusenc ! rtpopuspay" + name + "97"},
+    };
+    return " ! " + ends.at(codec);
+}
+
+/// Sound that goes on without a gap, channel by channel.
+struct Recording {
+    int rate = 0;
+    int channels = 0;
+    std::vector<std::vector<float>> planes;
+    bool whole = true; ///< every frame had the same format and its right length
+
+    double seconds() const { return planes.empty() ? 0.0 : static_cast<double>(planes[0].size()) / rate; }
+};
+
+class ReceiverSound : public ReceiverFixture {
+  protected:
+    static void SetUpTestSuite() {
+        ReceiverFixture::SetUpTestSuite();
+        for (const char* factory : {"audiotestsrc", "audioconvert", "rtpL16pay",  "rtpL16depay",  "rtpL24pay",
+                                    "rtpL24depay",  "mulawenc",     "mulawdec",   "alawenc",      "alawdec",
+                                    "rtppcmupay",   "rtppcmudepay", "rtppcmapay", "rtppcmadepay", "avenc_aac",
+                                    "avdec_aac",    "aacparse",     "rtpmp4gpay", "rtpmp4gdepay", "rtpmp4apay",
+                                    "rtpmp4adepay", "opusenc",      "opusdec",    "rtpopuspay",   "rtpopusdepay"}) {
+            if (GstElement* element = gst_element_factory_make(factory, nullptr)) {
+                gst_object_unref(gst_object_ref_sink(element));
+            }
+        }
+    }
+
+    std::unique_ptr<Receiver> listen(const std::string& url) {
+        return receive(url, "", QIVOlib_recv_bandwidth_audio_only);
+    }
+
+    /// One frame, appended; false if nothing came in time.
+    bool hear(Receiver& receiver, Recording& recording, std::chrono::milliseconds limit) {
+        const auto deadline = Clock::now() + limit;
+        QIVOlib_audio_frame_v2_t frame{};
+        int32_t type = QIVOlib_frame_type_none;
+        do {
+            type = receiver.capture(nullptr, &frame, nullptr, 50ms);
+            m_statusChanges += type == QIVOlib_frame_type_status_change ? 1 : 0;
+        } while (type != QIVOlib_frame_type_audio && Clock::now() < deadline);
+        if (type != QIVOlib_frame_type_audio) {
+            return false;
+        }
+        append(recording, frame);
+        receiver.freeAudio(&frame);
+        return true;
+    }
+
+    static void append(Recording& recording, const QIVOlib_audio_frame_v2_t& frame) {
+        if (recording.planes.empty()) {
+            recording.rate = frame.sample_rate;
+            recording.channels = frame.no_channels;
+            recording.planes.resize(static_cast<std::size_t>(frame.no_channels));
+        }
+        const std::int64_t milliseconds = std::int64_t{1000} * frame.no_samples;
+        recording.whole = recording.whole && frame.sample_rate == recording.rate &&
+                          frame.no_channels == recording.channels &&
+                          frame.channel_stride_in_bytes == 4 * frame.no_samples &&
+                          milliseconds >= SoundCutter::kShortest.count() * frame.sample_rate &&
+                          milliseconds <= SoundCutter::kLongest.count() * frame.sample_rate && frame.timestamp > 0;
+        for (int channel = 0; channel < recording.channels; ++channel) {
+            const float* plane = frame.p_data + static_cast<std::ptrdiff_t>(channel) * frame.no_samples;
+            auto& all = recording.planes[static_cast<std::size_t>(channel)];
+            all.insert(all.end(), plane, plane + frame.no_samples);
+        }
+    }
+
+    /// So many seconds; less if the source stops before.
+    Recording record(Receiver& receiver, double seconds, double skipped = 0.0) {
+        Recording begin;
+        while (begin.seconds() < skipped && hear(receiver, begin, 8s)) {
+        }
+        Recording recording;
+        while (recording.seconds() < seconds && hear(receiver, recording, 8s)) {
+        }
+        return recording;
+    }
+};
+
+struct Case {
+    const char* codec;
+    int rate;
+    int channels;
+    double tolerance; ///< of the level
+    const char* transport = "udp";
+};
+
+void PrintTo(const Case& shown, std::ostream* out) {
+    *out << shown.codec << shown.rate << "x" << shown.channels;
+}
+
+class EachSound : public ReceiverSound, public testing::WithParamInterface<Case> {};
+
+TEST_P(EachSound, HasItsOwnRateChannelsAndTone) {
+    const Case& wanted = GetParam();
+    const RtspServer server({.launch = tone(wanted.rate, wanted.channels) + payloader(wanted.codec),
+                             .tcpOnly = std::string(wanted.transport) == "tcp"});
+    const auto receiver = listen(server.url());
+    const Recording recording = record(*receiver, 0.6, 0.3); // encoders that look ahead begin with silence
+    ASSERT_GE(recording.seconds(), 0.6);
+    EXPECT_EQ(m_statusChanges, 1) << "the status change comes before the first sound";
+    EXPECT_EQ(recording.rate, wanted.rate);
+    ASSERT_EQ(recording.channels, wanted.channels);
+    EXPECT_TRUE(recording.whole);
+    for (int channel = 0; channel < wanted.channels; ++channel) {
+        const auto& plane = recording.planes[static_cast<std::size_t>(channel)];
+        const double level = levelOf(channel, wanted.channels);
+        EXPECT_NEAR(frequencyOf(plane, recording.rate), kTone, 1.0) << channel;
+        EXPECT_NEAR(amplitudeAt(plane, recording.rate, kTone), level, wanted.tolerance * level) << channel;
+        const double step = level * 2.0 * std::acos(-1.0) * kTone / recording.rate;
+        EXPECT_LE(largestStep(plane), step * (1.0 + wanted.tolerance) + wanted.tolerance * level) << channel;
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Receiver, EachSound,
+    testing::Values(Case{"L16", 8000, 1, 0.001}, Case{"L16", 44100, 2, 0.001}, Case{"L16", 48000, 2, 0.001, "tcp"},
+                    Case{"L16", 48000, 8, 0.001}, Case{"L16", 48001, 3, 0.001}, Case{"L16", 192000, 2, 0.001},
+                    Case{"L24", 48000, 2, 0.001}, Case{"L24", 96000, 8, 0.001}, Case{"L24", 192000, 8, 0.001},
+                    Case{"PCMU", 8000, 1, 0.05}, Case{"PCMA", 8000, 1, 0.05}, Case{"AAC", 48000, 2, 0.1},
+                    Case{"AAC", 44100, 1, 0.1}, Case{"AAC", 96000, 2, 0.1}, Case{"AAC", 8000, 1, 0.1},
+                    Case{"LATM", 44100, 2, 0.1}, Case{"OPUS", 48000, 1, 0.1}, Case{"OPUS", 48000, 2, 0.1, "tcp"}),
+    [](const auto& test) {
+        return std::string(test.param.codec) + "_" + std::to_string(test.param.rate) + "_" +
+               std::to_string(test.param.channels) + "_" + test.param.transport;
+    });
+
+TEST_F(ReceiverSound, SamplesOfPcmAreExact) {
+    RtspServer server({.launch =
+                           "audiotestsrc is-live=true wave=square volume=0.5 freq=100 ! "
+                           "audio/x-raw,rate=48000,channels=2,format=S16LE ! audioconvert ! rtpL16pay name=pay0"});
+    const auto receiver = listen(server.url());
+    const Recording recording = record(*receiver, 0.2);
+    ASSERT_GE(recording.seconds(), 0.2);
+    for (const auto& plane : recording.planes) {
+        for (const float sample : plane) {
+            ASSERT_EQ(sample * 32768.0F, std::round(sample * 32768.0F));
+            ASSERT_NEAR(std::abs(sample), 0.5F, 1.0F / 32768.0F);
+        }
+    }
+}
+
+TEST_F(ReceiverSound, LoudestSamplesStayWithinOne) {
+    RtspServer server({.launch =
+                           "audiotestsrc is-live=true wave=square volume=1 freq=100 ! "
+                           "audio/x-raw,rate=48000,channels=1,format=S16LE ! audioconvert ! rtpL16pay name=pay0"});
+    const auto receiver = listen(server.url());
+    const Recording recording = record(*receiver, 0.1);
+    ASSERT_GE(recording.seconds(), 0.1);
+    for (const float sample : recording.planes[0]) {
+        ASSERT_GE(std::abs(sample), 0.99F);
+        ASSERT_LE(std::abs(sample), 1.0F);
+    }
+}
+
+TEST_F(ReceiverSound, SetsUpOnlyTheSoundByTheRequestsItSends) {
+    const RtspServer server(
+        {.launch = h264("width=320,height=240,framerate=30/1") + " " + tone(48000, 2) + payloader("L16", 1)});
+    RawServer proxy;
+    std::mutex mutex;
+    std::string sent;
+    proxy.forwardTo(server.port(), [&](std::string bytes) {
+        const std::lock_guard guard(mutex);
+        sent += bytes;
+        return bytes;
+    });
+    const auto receiver = listen(proxy.url());
+    EXPECT_GE(record(*receiver, 0.1).seconds(), 0.1);
+    const std::lock_guard guard(mutex);
+    std::vector<std::string> setups;
+    for (std::size_t at = sent.find("SETUP "); at != std::string::npos; at = sent.find("SETUP ", at + 1)) {
+        setups.push_back(sent.substr(at, sent.find("\r\n", at) - at));
+    }
+    ASSERT_EQ(setups.size(), 1U) << sent;
+    EXPECT_THAT(setups[0], testing::HasSubstr("/live/stream=1 RTSP/1.0")) << "the second stream is the sound";
+    EXPECT_EQ(server.setups(), 1);
+}
+
+TEST_F(ReceiverSound, ReceiversOfPicturesSetUpNoSound) {
+    const RtspServer server(
+        {.launch = h264("width=320,height=240,framerate=30/1") + " " + tone(48000, 2) + payloader("L16", 1)});
+    for (const int bandwidth : {QIVOlib_recv_bandwidth_lowest, QIVOlib_recv_bandwidth_highest}) {
+        const int before = server.setups();
+        const auto receiver = receive(server.url(), "", bandwidth);
+        EXPECT_TRUE(nextPicture(*receiver));
+        QIVOlib_audio_frame_v2_t frame{};
+        EXPECT_NE(receiver->capture(nullptr, &frame, nullptr, 300ms), QIVOlib_frame_type_audio);
+        EXPECT_EQ(server.setups(), before + 1);
+    }
+}
+
+TEST_F(ReceiverSound, QueueDepthIsTrueAndTheOldestComesFirst) {
+    RtspServer server({.launch = tone(48000, 2) + payloader("L16")});
+    const auto receiver = listen(server.url());
+    const auto deadline = Clock::now() + 8s;
+    while (receiver->queue().audio_frames < 5 && Clock::now() < deadline) {
+        std::this_thread::sleep_for(1ms);
+    }
+    server.setSilent(true);
+    std::this_thread::sleep_for(100ms); // what is on its way arrives
+    EXPECT_TRUE(statusChanges(*receiver));
+    int depth = receiver->queue().audio_frames;
+    ASSERT_GE(depth, 5);
+    std::int64_t timecode = -1;
+    for (; depth > 0; --depth) {
+        EXPECT_EQ(receiver->queue().audio_frames, depth);
+        QIVOlib_audio_frame_v2_t frame{};
+        ASSERT_EQ(receiver->capture(nullptr, &frame, nullptr, 0ms), QIVOlib_frame_type_audio);
+        EXPECT_GT(frame.timecode, timecode);
+        timecode = frame.timecode;
+        receiver->freeAudio(&frame);
+    }
+    QIVOlib_audio_frame_v2_t frame{};
+    EXPECT_EQ(receiver->capture(nullptr, &frame, nullptr, 0ms), QIVOlib_frame_type_none);
+    EXPECT_EQ(receiver->queue().audio_frames, 0);
+    EXPECT_EQ(receiver->queue().video_frames, 0);
+}
+
+TEST_F(ReceiverSound, NobodyWhoListensKeepsAtMostAQuarterOfASecondOfTheNewest) {
+    RtspServer server({.launch = tone(48000, 2) + payloader("L16")});
+    const auto receiver = listen(server.url());
+    EXPECT_TRUE(statusChanges(*receiver));
+    const auto until = Clock::now() + 1s; // four times what is held
+    while (Clock::now() < until) {
+        EXPECT_LE(receiver->queue().audio_frames, 250 / 5);
+        std::this_thread::sleep_for(10ms);
+    }
+    server.setSilent(true);
+    const std::int64_t now =
+        std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::system_clock::now().time_since_epoch())
+            .count() *
+        10'000;
+    std::this_thread::sleep_for(100ms);
+    Recording rest;
+    QIVOlib_audio_frame_v2_t frame{};
+    while (receiver->capture(nullptr, &frame, nullptr, 0ms) == QIVOlib_frame_type_audio) {
+        EXPECT_GT(frame.timestamp, now - 5'000'000) << "the oldest is gone";
+        append(rest, frame);
+        receiver->freeAudio(&frame);
+    }
+    EXPECT_LE(rest.seconds(), 0.25);
+    EXPECT_GE(rest.seconds(), 0.2);
+}
+
+TEST_F(ReceiverSound, FramesOutAreBoundedAndEndWithTheReceiver) {
+    const RtspServer server({.launch = tone(48000, 2) + payloader("L16")});
+    auto receiver = listen(server.url());
+    std::vector<QIVOlib_audio_frame_v2_t> out;
+    const auto deadline = Clock::now() + 8s;
+    while (out.size() < SoundQueue::kOut && Clock::now() < deadline) {
+        QIVOlib_audio_frame_v2_t frame{};
+        if (receiver->capture(nullptr, &frame, nullptr, 50ms) == QIVOlib_frame_type_audio) {
+            out.push_back(frame);
+        }
+    }
+    ASSERT_EQ(out.size(), SoundQueue::kOut);
+    QIVOlib_audio_frame_v2_t frame{};
+    EXPECT_EQ(receiver->capture(nullptr, &frame, nullptr, 300ms), QIVOlib_frame_type_none);
+    const QIVOlib_audio_frame_v2_t foreign{};
+    receiver->freeAudio(&foreign);
+    receiver->freeAudio(nullptr);
+    EXPECT_EQ(receiver->capture(nullptr, &frame, nullptr, 100ms), QIVOlib_frame_type_none);
+    receiver->freeAudio(&out[7]);
+    EXPECT_EQ(receiver->capture(nullptr, &frame, nullptr, 1s), QIVOlib_frame_type_audio);
+}
+
+TEST_F(ReceiverSound, SilentSourceIsConnectedAgain) {
+    RtspServer server({.launch = tone(8000, 1) + payloader("PCMU")});
+    const auto receiver = listen(server.url());
+    ASSERT_GE(record(*receiver, 0.1).seconds(), 0.1);
+    const int before = server.connections();
+    server.setSilent(true);
+    const auto deadline = Clock::now() + 10s;
+    while (server.connections() == before && Clock::now() < deadline) {
+        std::this_thread::sleep_for(5ms);
+    }
+    EXPECT_GT(server.connections(), before);
+    server.setSilent(false);
+    EXPECT_TRUE(statusChanges(*receiver)) << "not told that it is connected again";
+    Recording more;
+    EXPECT_TRUE(hear(*receiver, more, 10s));
+}
+
+TEST_F(ReceiverSound, SourceWithoutSoundBringsNoneAndIsLeftInPeace) {
+    const RtspServer server({.launch = h264("width=320,height=240,framerate=30/1")});
+    const auto receiver = listen(server.url());
+    Recording none;
+    EXPECT_FALSE(hear(*receiver, none, 2s));
+    EXPECT_EQ(m_statusChanges, 0);
+    EXPECT_EQ(server.connections(), 1);
+    EXPECT_EQ(server.setups(), 0);
+}
+
+// --- Sound that no player could use
+
+struct Absurd {
+    const char* name;
+    const char* media; ///< in the server's description
+    const char* line;  ///< in the log
+};
+
+class AbsurdSound : public ReceiverSound, public testing::WithParamInterface<Absurd> {};
+
+TEST_P(AbsurdSound, IsRefusedWithALineBeforeAnythingIsSetUp) {
+    RawServer server;
+    std::atomic<int> setups = 0;
+    server.setScript([&](Connection& connection) {
+        for (std::string request = connection.request(); !request.empty(); request = connection.request()) {
+            if (request.rfind("DESCRIBE ", 0) == 0) {
+                connection.send(answer(request, "200 OK", "Content-Type: application/sdp\r\n",
+                                       std::string("v=0\r\no=- 0 0 IN IP4 127.0.0.1\r\ns=-\r\nt=0 0\r\n") +
+                                           GetParam().media + "a=control:stream=0\r\n"));
+            } else {
+                setups += request.rfind("SETUP ", 0) == 0 ? 1 : 0;
+                connection.send(answer(request));
+            }
+        }
+    });
+    testing::internal::CaptureStderr();
+    const auto receiver = listen(server.url());
+    Recording none;
+    EXPECT_FALSE(hear(*receiver, none, 1s));
+    EXPECT_EQ(setups, 0);
+    EXPECT_EQ(server.connections(), 1);
+    EXPECT_THAT(testing::internal::GetCapturedStderr(), testing::HasSubstr(GetParam().line));
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Receiver, AbsurdSound,
+    testing::Values(
+        Absurd{"RateOfOne", "m=audio 0 RTP/AVP 97\r\na=rtpmap:97 L16/1/2\r\n",
+               "sound of 1 Hz in 2 channels is not received: rates go from 8000 to 192000 Hz, channels from 1 to 8\n"},
+        Absurd{"RateBelow", "m=audio 0 RTP/AVP 97\r\na=rtpmap:97 L16/7999/1\r\n", "sound of 7999 Hz in 1 channels"},
+        Absurd{"RateAbove", "m=audio 0 RTP/AVP 97\r\na=rtpmap:97 L24/192001/1\r\n", "sound of 192001 Hz in 1 channels"},
+        Absurd{"GiantRate", "m=audio 0 RTP/AVP 97\r\na=rtpmap:97 L16/2147483647/2\r\n", "sound of 2147483647 Hz"},
+        Absurd{"NoChannels", "m=audio 0 RTP/AVP 97\r\na=rtpmap:97 L16/48000/0\r\n", "sound of 48000 Hz in 0 channels"},
+        Absurd{"NineChannels", "m=audio 0 RTP/AVP 97\r\na=rtpmap:97 L16/48000/9\r\n", "in 9 channels"},
+        Absurd{"ManyChannels", "m=audio 0 RTP/AVP 97\r\na=rtpmap:97 PCMU/8000/1000\r\n", "in 1000 channels"},
+        Absurd{"UnknownEncoding", "m=audio 0 RTP/AVP 97\r\na=rtpmap:97 ABSURD/48000/2\r\n",
+               "sound as ABSURD is not received\n"}),
+    [](const auto& test) { return test.param.name; });
+
+TEST_F(ReceiverSound, RateThatOnlyTheStreamTellsIsRefusedToo) {
+    const RtspServer server({.launch = tone(7350, 1) + payloader("AAC")});
+    testing::internal::CaptureStderr();
+    const auto receiver = listen(server.url());
+    Recording none;
+    EXPECT_FALSE(hear(*receiver, none, 2s));
+    EXPECT_EQ(server.connections(), 1) << "it is left in peace";
+    EXPECT_THAT(testing::internal::GetCapturedStderr(), testing::HasSubstr("sound of 7350 Hz in 1 channels"));
+}
+
+} // namespace
+} // namespace qivo::test

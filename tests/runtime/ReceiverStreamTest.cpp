@@ -1,0 +1,320 @@
+// What a receiver makes of a source that conforms.
+
+#include "tests/runtime/CountingAllocator.h"
+#include "tests/runtime/ReceiverFixture.h"
+
+#include <algorithm>
+#include <ostream>
+#include <thread>
+#include <utility>
+#include <vector>
+
+namespace qivo::test {
+namespace {
+
+using runtime::Receiver;
+
+class ReceiverStreams : public ReceiverFixture {};
+
+class EachCodec : public ReceiverFixture, public testing::WithParamInterface<std::pair<const char*, const char*>> {};
+
+TEST_P(EachCodec, IsDecoded) {
+    const std::string caps = "width=320,height=240,framerate=30/1";
+    const std::string codec = GetParam().first;
+    const std::string launch = codec == "h264" ? h264(caps) : codec == "h265" ? h265(caps) : jpeg(caps);
+    const RtspServer server({.launch = launch, .tcpOnly = std::string(GetParam().second) == "tcp"});
+    const auto receiver = receive(server.url());
+    const Shot shot = nextPicture(*receiver);
+    ASSERT_TRUE(shot);
+    EXPECT_EQ(shot.record.xres, 320);
+    EXPECT_EQ(shot.record.yres, 240);
+    EXPECT_EQ(std::string(reinterpret_cast<const char*>(&shot.record.FourCC), 4), "RGBA");
+    EXPECT_GE(shot.record.line_stride_in_bytes, 320 * 4);
+    EXPECT_EQ(shot.record.frame_format_type, 1);
+    EXPECT_NEAR(shot.record.picture_aspect_ratio, 320.0 / 240.0, 1e-6);
+    EXPECT_EQ(m_statusChanges, 1) << "the status change comes before the first picture";
+}
+
+INSTANTIATE_TEST_SUITE_P(Receiver, EachCodec,
+                         testing::Values(std::pair("h264", "udp"), std::pair("h265", "udp"), std::pair("jpeg", "udp"),
+                                         std::pair("h264", "tcp"), std::pair("h265", "tcp"), std::pair("jpeg", "tcp")),
+                         [](const auto& test) { return std::string(test.param.first) + "_" + test.param.second; });
+
+// --- Colours
+
+struct Colour {
+    const char* name;
+    std::string launch;
+    int levels;
+};
+
+void PrintTo(const Colour& shown, std::ostream* out) {
+    *out << shown.name;
+}
+
+/// One colour, converted to what the caps say; the test source alone knows no full range.
+std::string solid(const std::string& size, const std::string& colorimetry, const std::string& encoder) {
+    return "videotestsrc name=pattern is-live=true do-timestamp=true pattern=solid-color ! video/x-raw,format=RGB," +
+           size + ",framerate=15/1 ! videoconvert ! video/x-raw,format=I420,colorimetry=" + colorimetry + " ! " +
+           encoder;
+}
+
+const std::string kH264 = "x264enc tune=zerolatency speed-preset=ultrafast key-int-max=15 bitrate=4000 ! rtph264pay "
+                          "name=pay0 pt=96 config-interval=-1";
+const std::string kJpeg = "jpegenc quality=95 ! rtpjpegpay name=pay0 pt=26";
+
+class Colours : public ReceiverFixture, public testing::WithParamInterface<Colour> {};
+
+TEST_P(Colours, AreRight) {
+    RtspServer server({.launch = GetParam().launch});
+    const auto receiver = receive(server.url());
+    ASSERT_TRUE(nextPicture(*receiver));
+    for (const unsigned colour : {0xff0000U, 0x00ff00U, 0x0000ffU, 0xffffffU, 0x000000U, 0x808080U, 0xc08040U}) {
+        server.set("pattern", "foreground-color", std::to_string(0xff000000U | colour));
+        unsigned seen = 0;
+        EXPECT_TRUE(pictureThat(
+            *receiver,
+            [&](const Shot& shot) {
+                seen = shot.pixel(shot.record.xres / 2, shot.record.yres / 2);
+                return near(seen, colour, GetParam().levels) && near(shot.pixel(0, 0), colour, GetParam().levels) &&
+                       near(shot.pixel(shot.record.xres - 1, shot.record.yres - 1), colour, GetParam().levels);
+            },
+            2s))
+            << std::hex << colour << " looks like " << seen;
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Receiver, Colours,
+                         testing::Values(Colour{"StandardDefinition", solid("width=320,height=240", "bt601", kH264), 8},
+                                         Colour{"HighDefinition", solid("width=1280,height=720", "bt709", kH264), 8},
+                                         Colour{"FullRange", solid("width=1280,height=720", "1:3:5:1", kH264), 8},
+                                         Colour{"Jpeg", solid("width=320,height=240", "1:4:0:0", kJpeg), 8}),
+                         [](const auto& test) { return std::string(test.param.name); });
+
+// --- Geometry
+
+TEST_F(ReceiverStreams, AspectRatioIsThePixelsTimesTheSize) {
+    const RtspServer server({.launch = h264("width=320,height=240,framerate=30/1,pixel-aspect-ratio=16/11")});
+    const auto receiver = receive(server.url());
+    const Shot shot = nextPicture(*receiver);
+    ASSERT_TRUE(shot);
+    EXPECT_EQ(shot.record.xres, 320);
+    EXPECT_NEAR(shot.record.picture_aspect_ratio, 320.0 * 16 / (240.0 * 11), 1e-5);
+}
+
+TEST_F(ReceiverStreams, SizeMayChangeInMidStream) {
+    RtspServer server({.launch = h264("width=320,height=240,framerate=30/1")});
+    const auto receiver = receive(server.url());
+    ASSERT_TRUE(nextPicture(*receiver));
+    server.set("size", "caps", "video/x-raw,format=I420,width=638,height=360,framerate=30/1");
+    const Shot shot = pictureThat(*receiver, [](const Shot& s) { return s.record.xres == 638; });
+    ASSERT_TRUE(shot);
+    EXPECT_EQ(shot.record.yres, 360);
+    EXPECT_GE(shot.record.line_stride_in_bytes, 638 * 4);
+    EXPECT_NEAR(shot.record.picture_aspect_ratio, 638.0 / 360.0, 1e-5);
+    EXPECT_EQ(server.connections(), 1) << "the size changed by a reconnection";
+}
+
+TEST_F(ReceiverStreams, OddSizesHaveTheirOwnRows) {
+    const RtspServer server({.launch = h264("width=322,height=242,framerate=30/1", "white")});
+    const auto receiver = receive(server.url());
+    const Shot shot = nextPicture(*receiver);
+    ASSERT_TRUE(shot);
+    EXPECT_EQ(shot.record.xres, 322);
+    EXPECT_EQ(shot.record.yres, 242);
+    EXPECT_TRUE(near(shot.pixel(321, 241), 0xffffff, 4));
+}
+
+// --- Time
+
+TEST_F(ReceiverStreams, TimesAndRateAreFilledIn) {
+    const RtspServer server({.launch = h264("width=320,height=240,framerate=25/1")});
+    const auto receiver = receive(server.url());
+    Shot first = nextPicture(*receiver);
+    ASSERT_TRUE(first);
+    EXPECT_EQ(first.record.frame_rate_N, 25 * first.record.frame_rate_D);
+    const auto before = first.record;
+    first.release();
+    const Shot second = nextPicture(*receiver);
+    ASSERT_TRUE(second);
+    EXPECT_GT(second.record.timecode, before.timecode);
+    EXPECT_GT(second.record.timestamp, before.timestamp);
+    const auto now =
+        std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::system_clock::now().time_since_epoch())
+            .count();
+    EXPECT_NEAR(static_cast<double>(second.record.timestamp / 10000), static_cast<double>(now), 1000.0);
+}
+
+TEST_F(ReceiverStreams, NewestPictureWins) {
+    const RtspServer server({.launch = h264("width=320,height=240,framerate=30/1")});
+    const auto receiver = receive(server.url());
+    Shot first = nextPicture(*receiver);
+    ASSERT_TRUE(first);
+    const auto before = first.record.timecode;
+    first.release();
+    std::this_thread::sleep_for(700ms); // a caller that is slow
+    const Shot next = nextPicture(*receiver);
+    ASSERT_TRUE(next);
+    EXPECT_GT(next.record.timecode - before, 6'000'000) << "an old picture was kept";
+    EXPECT_LE(receiver->queue().video_frames, 1);
+}
+
+TEST_F(ReceiverStreams, QueueTellsWhetherAPictureWaits) {
+    const RtspServer server({.launch = h264("width=320,height=240,framerate=5/1")});
+    const auto receiver = receive(server.url());
+    ASSERT_TRUE(nextPicture(*receiver));
+    EXPECT_EQ(receiver->queue().video_frames, 0);
+    const auto deadline = Clock::now() + 5s;
+    while (receiver->queue().video_frames == 0 && Clock::now() < deadline) {
+        std::this_thread::sleep_for(1ms);
+    }
+    EXPECT_EQ(receiver->queue().video_frames, 1);
+    EXPECT_EQ(receiver->queue().audio_frames, 0);
+}
+
+/// The time from a change of the source's picture to its capture.
+std::chrono::milliseconds latencyOf(RtspServer& server, const std::function<bool(unsigned)>& waitFor, bool bright) {
+    server.set("pattern", "pattern", bright ? "white" : "black");
+    const auto changed = Clock::now();
+    EXPECT_TRUE(waitFor(bright ? 0xffffffU : 0U));
+    return std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - changed);
+}
+
+TEST_F(ReceiverStreams, LatencyIsLowAndDoesNotGrow) {
+    RtspServer server({.launch = h264("width=320,height=240,framerate=30/1", "black")});
+    std::vector<std::chrono::milliseconds> medians;
+    for (int connection = 0; connection < 3; ++connection) {
+        const auto receiver = receive(server.url());
+        ASSERT_TRUE(nextPicture(*receiver));
+        const auto waitFor = [&](unsigned colour) {
+            return static_cast<bool>(pictureThat(
+                *receiver, [&](const Shot& s) { return near(s.pixel(160, 120), colour, 8); }, 3s));
+        };
+        for (int half = 0; half < 2; ++half) {
+            std::vector<std::chrono::milliseconds> latencies;
+            for (int i = 0; i < 15; ++i) {
+                latencies.push_back(latencyOf(server, waitFor, i % 2 == 0));
+            }
+            std::nth_element(latencies.begin(), latencies.begin() + 7, latencies.end());
+            medians.push_back(latencies[7]);
+        }
+    }
+    for (const auto median : medians) {
+        // A picture's interval, encoder and server included.
+        EXPECT_LT(median, 150ms);
+        EXPECT_LT(median, medians.front() + 50ms) << "the latency grows";
+    }
+    RecordProperty("first_ms", static_cast<int>(medians.front().count()));
+    RecordProperty("last_ms", static_cast<int>(medians.back().count()));
+}
+
+// --- Streams
+
+TEST_F(ReceiverStreams, OnlyTheFirstVideoStreamOfSeveralIsSetUp) {
+    const RtspServer server(
+        {.launch = "audiotestsrc is-live=true ! alawenc ! rtppcmapay name=pay0 pt=8 " +
+                   std::string("videotestsrc is-live=true ! video/x-raw,format=I420,width=160,height=120 ! "
+                               "jpegenc ! rtpjpegpay name=pay1 pt=26 "
+                               "videotestsrc is-live=true ! video/x-raw,format=I420,width=320,height=240 ! "
+                               "jpegenc ! rtpjpegpay name=pay2 pt=26")});
+    const auto receiver = receive(server.url());
+    const Shot shot = nextPicture(*receiver);
+    ASSERT_TRUE(shot);
+    EXPECT_EQ(shot.record.xres, 160);
+    EXPECT_EQ(server.setups(), 1);
+}
+
+TEST_F(ReceiverStreams, AudioOnlyConnectsAndShowsNoPictures) {
+    const RtspServer server({.launch = h264("width=320,height=240,framerate=30/1") +
+                                       " audiotestsrc is-live=true ! alawenc ! rtppcmapay name=pay1 pt=8"});
+    const auto receiver = receive(server.url(), "", QIVOlib_recv_bandwidth_audio_only);
+    EXPECT_TRUE(statusChanges(*receiver));
+    EXPECT_FALSE(nextPicture(*receiver, 500ms));
+    EXPECT_EQ(server.setups(), 1);
+}
+
+TEST_F(ReceiverStreams, AudioOnlyOfASourceWithoutSoundLeavesItInPeace) {
+    const RtspServer server({.launch = h264("width=320,height=240,framerate=30/1")});
+    const auto receiver = receive(server.url(), "", QIVOlib_recv_bandwidth_audio_only);
+    EXPECT_FALSE(statusChanges(*receiver, 2s));
+    EXPECT_EQ(server.connections(), 1);
+    EXPECT_EQ(server.setups(), 0);
+}
+
+TEST_F(ReceiverStreams, LowBandwidthTakesTheLowStream) {
+    const RtspServer server({.launch = h264("width=320,height=240,framerate=30/1"),
+                             .lowLaunch = h264("width=160,height=120,framerate=10/1")});
+    m_view->announce({{"STUDIO (Cam 1)", server.url(), server.url("/low"), "", "", true}});
+    for (const auto& [url, name] : {std::pair(server.url(), ""), std::pair(std::string(), "STUDIO (Cam 1)")}) {
+        const auto low = receive(url, name, QIVOlib_recv_bandwidth_lowest);
+        const Shot shot = nextPicture(*low);
+        ASSERT_TRUE(shot);
+        EXPECT_EQ(shot.record.xres, 160);
+        const auto full = receive(url, name, QIVOlib_recv_bandwidth_highest);
+        const Shot large = nextPicture(*full);
+        ASSERT_TRUE(large);
+        EXPECT_EQ(large.record.xres, 320);
+    }
+}
+
+TEST_F(ReceiverStreams, LoginOfTheUrlIsUsed) {
+    const RtspServer server(
+        {.launch = h264("width=320,height=240,framerate=30/1"), .user = "viewer", .password = "secret"});
+    const std::string rest = server.url().substr(7);
+    EXPECT_FALSE(nextPicture(*receive("rtsp://viewer:wrong@" + rest), 1s));
+    EXPECT_TRUE(nextPicture(*receive("rtsp://viewer:secret@" + rest)));
+}
+
+TEST_F(ReceiverStreams, UnknownFormatsAndBandwidthsAreRefused) {
+    QIVOlib_recv_create_v3_t settings{};
+    EXPECT_FALSE(Receiver::create(nullptr, {nullptr, m_transports}));
+    settings.color_format = QIVOlib_recv_color_format_rgba;
+    settings.bandwidth = QIVOlib_recv_bandwidth_highest;
+    EXPECT_FALSE(Receiver::create(&settings, {nullptr, m_transports})) << "no source";
+    settings.source.p_url_address = "";
+    settings.source.p_name = "";
+    EXPECT_FALSE(Receiver::create(&settings, {nullptr, m_transports})) << "no source";
+    settings.source.p_url_address = "rtsp://127.0.0.1:9/";
+    EXPECT_TRUE(Receiver::create(&settings, {nullptr, m_transports}));
+    settings.bandwidth = 50;
+    EXPECT_FALSE(Receiver::create(&settings, {nullptr, m_transports}));
+    settings.bandwidth = QIVOlib_recv_bandwidth_highest;
+    settings.color_format = 0;
+    EXPECT_FALSE(Receiver::create(&settings, {nullptr, m_transports}));
+    settings.color_format = QIVOlib_recv_color_format_fastest;
+    EXPECT_TRUE(Receiver::create(&settings, {nullptr, m_transports}));
+}
+
+// --- Memory
+
+TEST_F(ReceiverStreams, AtMostFourPicturesAreInMemory) {
+    const RtspServer server({.launch = h264("width=640,height=480,framerate=30/1")});
+    CountingAllocator counter(640UL * 480 * 4);
+    const auto receiver = receive(server.url());
+    std::vector<Shot> held;
+    for (std::size_t i = 0; i < runtime::Mailbox::kPicturesOut; ++i) {
+        held.push_back(nextPicture(*receiver));
+        ASSERT_TRUE(held.back());
+    }
+    EXPECT_FALSE(nextPicture(*receiver, 500ms)) << "beyond the bound";
+    const auto oldest = held.front().record.timecode;
+    held.erase(held.begin());
+    const Shot next = nextPicture(*receiver);
+    ASSERT_TRUE(next);
+    EXPECT_GT(next.record.timecode - oldest, 4'000'000) << "not the newest";
+    EXPECT_GE(counter.most(), 3) << "the pictures are not counted";
+    EXPECT_LE(counter.most(), static_cast<int>(runtime::Mailbox::kPictures));
+}
+
+TEST_F(ReceiverStreams, MemoryDoesNotGrowWithTheStream) {
+    const RtspServer server({.launch = h264("width=640,height=480,framerate=60/1")});
+    CountingAllocator counter(640UL * 480 * 4);
+    const auto receiver = receive(server.url());
+    for (int i = 0; i < 60; ++i) {
+        ASSERT_TRUE(nextPicture(*receiver));
+    }
+    EXPECT_LE(counter.most(), static_cast<int>(runtime::Mailbox::kPictures));
+}
+
+} // namespace
+} // namespace qivo::test

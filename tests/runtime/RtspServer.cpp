@@ -1,0 +1,181 @@
+#include "tests/runtime/RtspServer.h"
+
+#include <stdexcept>
+#include <utility>
+
+namespace qivo::test {
+
+/// What the server calls, on its own thread.
+struct RtspServer::Callbacks {
+    static RtspServer& self(gpointer data) { return *static_cast<RtspServer*>(data); }
+
+    static void connected(GstRTSPServer*, GstRTSPClient* client, gpointer data) {
+        ++self(data).m_connections;
+        g_signal_connect(client, "setup-request", G_CALLBACK(setUp), data);
+    }
+
+    static void setUp(GstRTSPClient*, GstRTSPContext* context, gpointer data) {
+        ++self(data).m_setups;
+        gchar* transport = nullptr;
+        gst_rtsp_message_get_header(context->request, GST_RTSP_HDR_TRANSPORT, &transport, 0);
+        if (transport != nullptr && std::string(transport).find("TCP") != std::string::npos) {
+            ++self(data).m_tcpSetups;
+        }
+    }
+
+    static void configure(GstRTSPMediaFactory*, GstRTSPMedia* media, gpointer data) {
+        RtspServer& server = self(data);
+        GstElement* element = gst_rtsp_media_get_element(media);
+        for (int i = 0; GstElement* payloader = payloaderOf(element, i); ++i) {
+            GstPad* pad = gst_element_get_static_pad(payloader, "src");
+            gst_pad_add_probe(pad,
+                              static_cast<GstPadProbeType>(GST_PAD_PROBE_TYPE_BUFFER | GST_PAD_PROBE_TYPE_BUFFER_LIST),
+                              send, new std::shared_ptr<std::atomic<bool>>(server.m_silent), // NOLINT
+                              [](gpointer silent) { delete static_cast<std::shared_ptr<std::atomic<bool>>*>(silent); });
+            gst_object_unref(pad);
+            gst_object_unref(payloader);
+        }
+        const std::lock_guard guard(server.m_mutex);
+        if (server.m_pipeline != nullptr) {
+            gst_object_unref(server.m_pipeline);
+        }
+        server.m_pipeline = element;
+    }
+
+    static GstElement* payloaderOf(GstElement* bin, int number) {
+        return gst_bin_get_by_name(GST_BIN(bin), ("pay" + std::to_string(number)).c_str());
+    }
+
+    static GstPadProbeReturn send(GstPad*, GstPadProbeInfo*, gpointer data) {
+        return **static_cast<std::shared_ptr<std::atomic<bool>>*>(data) ? GST_PAD_PROBE_DROP : GST_PAD_PROBE_OK;
+    }
+
+    static GstRTSPFilterResult removeClient(GstRTSPServer*, GstRTSPClient*, gpointer) { return GST_RTSP_FILTER_REMOVE; }
+};
+
+RtspServer::RtspServer(Options options) : m_options(std::move(options)) {
+    gst_init(nullptr, nullptr);
+    m_context = g_main_context_new();
+    m_loop = g_main_loop_new(m_context, FALSE);
+    m_server = gst_rtsp_server_new();
+    gst_rtsp_server_set_address(m_server, m_options.address.c_str());
+    gst_rtsp_server_set_service(m_server, std::to_string(m_options.port).c_str());
+    if (!m_options.user.empty()) {
+        GstRTSPAuth* auth = gst_rtsp_auth_new();
+        GstRTSPToken* token =
+            gst_rtsp_token_new(GST_RTSP_TOKEN_MEDIA_FACTORY_ROLE, G_TYPE_STRING, m_options.user.c_str(), nullptr);
+        gchar* basic = gst_rtsp_auth_make_basic(m_options.user.c_str(), m_options.password.c_str());
+        gst_rtsp_auth_add_basic(auth, basic, token);
+        g_free(basic);
+        gst_rtsp_token_unref(token);
+        gst_rtsp_server_set_auth(m_server, auth);
+        g_object_unref(auth);
+    }
+    addFactory(m_options.path, m_options.launch);
+    if (!m_options.lowLaunch.empty()) {
+        addFactory(m_options.lowPath, m_options.lowLaunch);
+    }
+    g_signal_connect(m_server, "client-connected", G_CALLBACK(Callbacks::connected), this);
+    if (gst_rtsp_server_attach(m_server, m_context) == 0) {
+        throw std::runtime_error("the RTSP server does not start");
+    }
+    m_port = gst_rtsp_server_get_bound_port(m_server);
+    m_thread = std::thread([this] {
+        g_main_context_push_thread_default(m_context);
+        g_main_loop_run(m_loop);
+        g_main_context_pop_thread_default(m_context);
+    });
+}
+
+RtspServer::~RtspServer() {
+    GList* removed = gst_rtsp_server_client_filter(m_server, Callbacks::removeClient, nullptr);
+    g_list_free_full(removed, g_object_unref);
+    GstRTSPSessionPool* pool = gst_rtsp_server_get_session_pool(m_server);
+    gst_rtsp_session_pool_filter(
+        pool, [](GstRTSPSessionPool*, GstRTSPSession*, gpointer) { return GST_RTSP_FILTER_REMOVE; }, nullptr);
+    g_object_unref(pool);
+    GSource* quit = g_idle_source_new();
+    g_source_set_priority(quit, G_PRIORITY_LOW);
+    g_source_set_callback(
+        quit,
+        [](gpointer loop) -> gboolean {
+            g_main_loop_quit(static_cast<GMainLoop*>(loop));
+            return G_SOURCE_REMOVE;
+        },
+        m_loop, nullptr);
+    g_source_attach(quit, m_context);
+    g_source_unref(quit);
+    m_thread.join();
+    if (m_pipeline != nullptr) {
+        gst_object_unref(m_pipeline);
+    }
+    GSource* listener = g_main_context_find_source_by_id(m_context, 1);
+    if (listener != nullptr) {
+        g_source_destroy(listener);
+    }
+    g_object_unref(m_server);
+    g_main_loop_unref(m_loop);
+    g_main_context_unref(m_context);
+}
+
+std::string RtspServer::url(const std::string& path) const {
+    return "rtsp://" + m_options.address + ":" + std::to_string(m_port) + path;
+}
+
+void RtspServer::addFactory(const std::string& path, const std::string& launch) {
+    GstRTSPMountPoints* mounts = gst_rtsp_server_get_mount_points(m_server);
+    GstRTSPMediaFactory* factory = gst_rtsp_media_factory_new();
+    gst_rtsp_media_factory_set_launch(factory, ("( " + launch + " )").c_str());
+    gst_rtsp_media_factory_set_shared(factory, TRUE);
+    gst_rtsp_media_factory_set_latency(factory, 0);
+    gst_rtsp_media_factory_set_protocols(
+        factory, m_options.tcpOnly
+                     ? GST_RTSP_LOWER_TRANS_TCP
+                     : static_cast<GstRTSPLowerTrans>(GST_RTSP_LOWER_TRANS_TCP | GST_RTSP_LOWER_TRANS_UDP));
+    if (!m_options.user.empty()) {
+        GstRTSPPermissions* permissions = gst_rtsp_permissions_new();
+        gst_rtsp_permissions_add_role(permissions, m_options.user.c_str(), GST_RTSP_PERM_MEDIA_FACTORY_ACCESS,
+                                      G_TYPE_BOOLEAN, TRUE, GST_RTSP_PERM_MEDIA_FACTORY_CONSTRUCT, G_TYPE_BOOLEAN, TRUE,
+                                      nullptr);
+        gst_rtsp_media_factory_set_permissions(factory, permissions);
+        gst_rtsp_permissions_unref(permissions);
+    }
+    g_signal_connect(factory, "media-configure", G_CALLBACK(Callbacks::configure), this);
+    gst_rtsp_mount_points_add_factory(mounts, path.c_str(), factory);
+    g_object_unref(mounts);
+}
+
+void RtspServer::set(const std::string& element, const std::string& property, const std::string& value) {
+    const std::lock_guard guard(m_mutex);
+    GstElement* found = m_pipeline != nullptr ? gst_bin_get_by_name(GST_BIN(m_pipeline), element.c_str()) : nullptr;
+    if (found == nullptr) {
+        throw std::runtime_error("there is no running element " + element);
+    }
+    gst_util_set_object_arg(G_OBJECT(found), property.c_str(), value.c_str());
+    gst_object_unref(found);
+}
+
+namespace {
+
+std::string pictures(const std::string& caps, const std::string& pattern) {
+    return "videotestsrc name=pattern is-live=true do-timestamp=true pattern=" + pattern +
+           " ! capsfilter name=size caps=\"video/x-raw,format=I420," + caps + "\"";
+}
+
+} // namespace
+
+std::string h264(const std::string& caps, const std::string& pattern) {
+    return pictures(caps, pattern) + " ! x264enc tune=zerolatency speed-preset=ultrafast key-int-max=15 bitrate=4000"
+                                     " ! rtph264pay name=pay0 pt=96 config-interval=-1";
+}
+
+std::string h265(const std::string& caps, const std::string& pattern) {
+    return pictures(caps, pattern) + " ! x265enc tune=zerolatency speed-preset=ultrafast key-int-max=15 log-level=none"
+                                     " ! rtph265pay name=pay0 pt=96 config-interval=-1";
+}
+
+std::string jpeg(const std::string& caps, const std::string& pattern) {
+    return pictures(caps, pattern) + " ! jpegenc quality=95 ! rtpjpegpay name=pay0 pt=26";
+}
+
+} // namespace qivo::test

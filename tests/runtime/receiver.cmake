@@ -1,0 +1,25 @@
+# The libraries underneath keep no frame pointers, and only a complete stack tells their leaks from ours.
+set(unwind "ASAN_OPTIONS=detect_leaks=1:detect_stack_use_after_return=1:strict_string_checks=1:fast_unwind_on_malloc=0:malloc_context_size=10")
+
+add_library(qivo_receiver_fixture STATIC CountingAllocator.cpp CountingAllocator.h
+                                         ReceiverFixture.cpp ReceiverFixture.h RtspServer.cpp RtspServer.h
+                                         RawServer.cpp RawServer.h)
+target_link_libraries(qivo_receiver_fixture PUBLIC qivo_runtime PkgConfig::GSTRTSPSERVER GTest::gtest)
+
+qivo_test(receiver-streams SOURCES ReceiverStreamTest.cpp LIBRARIES qivo_receiver_fixture NETWORK SERIAL
+          ENVIRONMENT ${unwind})
+qivo_test(receiver-hostile SOURCES ReceiverHostileTest.cpp LIBRARIES qivo_receiver_fixture NETWORK
+          ENVIRONMENT ${unwind})
+qivo_test(receiver-healing SOURCES ReceiverHealingTest.cpp LIBRARIES qivo_receiver_fixture NETWORK SERIAL
+          ENVIRONMENT ${unwind})
+qivo_test(sound-parts SOURCES SoundQueueTest.cpp LIBRARIES qivo_runtime TSAN)
+qivo_test(receiver-sound SOURCES ReceiverSoundTest.cpp LIBRARIES qivo_receiver_fixture qivo_test_tone NETWORK SERIAL
+          ENVIRONMENT ${unwind} TIMEOUT 120)
+qivo_test(receiver-parts SOURCES ReceiverPartsTest.cpp LIBRARIES qivo_runtime TSAN)
+
+# Through the library itself, which brings its own copy of everything that it is made of.
+if(NOT QIVO_SANITIZE STREQUAL "thread")
+    qivo_test(receiver-handles SOURCES ReceiverHandleTest.cpp RtspServer.cpp LIBRARIES qivo PkgConfig::GSTRTSPSERVER
+              PkgConfig::GSTREAMER NETWORK ENVIRONMENT ${unwind})
+    target_compile_definitions(receiver-handles PRIVATE QIVO_LIBRARY="$<TARGET_FILE:qivo>")
+endif()
