@@ -1,0 +1,38 @@
+#pragma once
+
+#include "tools/publish/Handles.h"
+
+#include <chrono>
+#include <string>
+#include <vector>
+
+namespace qivo::test {
+
+/// Sound that was received, channel by channel.
+struct Heard {
+    int rate = 0;
+    std::vector<std::vector<float>> planes;
+
+    [[nodiscard]] double seconds() const { return planes.empty() ? 0.0 : static_cast<double>(planes[0].size()) / rate; }
+};
+
+/// A listener to an RTSP address, built of GStreamer's own receiver.
+class Listener {
+  public:
+    explicit Listener(const std::string& address, const std::string& protocol = "udp");
+    ~Listener();
+    Listener(const Listener&) = delete;
+    Listener& operator=(const Listener&) = delete;
+
+    /// What comes next, this long; less if the deadline passes first.
+    Heard hear(std::chrono::milliseconds length, std::chrono::milliseconds deadline = std::chrono::seconds(15));
+
+  private:
+    Object<GstElement> m_pipeline;
+    Object<GstElement> m_sink;
+};
+
+/// The server's description of what it serves at an address, in SDP; empty if it gives none.
+std::string descriptionOf(const std::string& address);
+
+} // namespace qivo::test

@@ -1,0 +1,77 @@
+#include "tests/tools/Publisher.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+namespace qivo::test {
+namespace {
+
+using namespace std::chrono_literals;
+
+struct Outcome {
+    std::optional<int> code;
+    std::string output;
+};
+
+Outcome play(const std::string& command) {
+    const auto process = Process::start({"/bin/sh", "-c", command + " 2>&1 </dev/null"});
+    const auto code = process->wait(40s);
+    return {code, process->output()};
+}
+
+TEST(Peers, ffprobeReadsTheStreamsSizeRateAndColours) {
+    const PublishProcess publisher({});
+    const Outcome result =
+        play("ffprobe -v error -show_entries stream=codec_name,width,height,color_space,has_b_frames "
+             "-of csv=p=0 " +
+             publisher.address(0));
+    EXPECT_EQ(result.code, 0) << result.output;
+    EXPECT_EQ(result.output, "h264,1280,720,0,bt709\n");
+}
+
+TEST(Peers, ffmpegDecodesEveryCodecOverUdpAndTcpWithoutAComplaint) {
+    const PublishProcess publisher(
+        {"--source", "A", "--source", "B", "--codec", "h265", "--source", "C", "--codec", "mjpeg"}, 6);
+    for (const std::size_t line : {0U, 1U, 2U, 4U}) {
+        for (const char* transport : {"udp", "tcp"}) {
+            const Outcome result = play(std::string("ffmpeg -v error -rtsp_transport ") + transport + " -i " +
+                                        publisher.address(line) + " -frames:v 30 -f null -");
+            EXPECT_EQ(result.code, 0) << result.output;
+            EXPECT_EQ(result.output, "") << line << transport;
+        }
+    }
+}
+
+TEST(Peers, mpvPlaysFullAndLowStream) {
+    const PublishProcess publisher({});
+    for (const std::size_t line : {0U, 1U}) {
+        const Outcome result =
+            play("mpv --no-config --vo=null --ao=null --frames=30 --msg-level=all=warn --no-terminal " +
+                 publisher.address(line));
+        EXPECT_EQ(result.code, 0) << result.output;
+    }
+}
+
+TEST(Peers, ffplayAsksForARangeAndIsServed) {
+    const PublishProcess publisher({});
+    const Outcome result =
+        play("SDL_VIDEODRIVER=dummy timeout 8 ffplay -hide_banner -nostats -an -v verbose " + publisher.address(0));
+    constexpr int endedByTimeout = 124;
+    EXPECT_EQ(result.code, endedByTimeout) << result.output;
+    EXPECT_THAT(result.output, testing::HasSubstr("Created 1280x720 texture"));
+    EXPECT_THAT(result.output, testing::Not(testing::ContainsRegex("method [A-Z]+ failed")));
+}
+
+TEST(Peers, mpvPlaysALoopedFileAsALiveStream) {
+    const auto made = play("ffmpeg -v error -y -f lavfi -i testsrc=duration=1:size=320x240:rate=25 -pix_fmt yuv420p "
+                           "/tmp/publish-peers-film.mp4");
+    ASSERT_EQ(made.code, 0) << made.output;
+    const PublishProcess publisher({"--input", "/tmp/publish-peers-film.mp4", "--size", "320x240", "--rate", "25"});
+    const Outcome result =
+        play("mpv --no-config --vo=null --ao=null --frames=60 --no-terminal " + publisher.address(0));
+    EXPECT_EQ(result.code, 0) << result.output;
+    EXPECT_EQ(std::remove("/tmp/publish-peers-film.mp4"), 0);
+}
+
+} // namespace
+} // namespace qivo::test

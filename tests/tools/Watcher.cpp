@@ -1,0 +1,83 @@
+#include "tests/tools/Watcher.h"
+
+#include "tools/publish/TimeCode.h"
+
+#include <gst/app/gstappsink.h>
+#include <gst/video/video.h>
+#include <gtest/gtest.h>
+
+#include <cstring>
+
+namespace qivo::test {
+
+using namespace std::chrono;
+
+std::optional<std::int64_t> Frame::timeCode() const {
+    return readTimeCode(pixels.data(), width, height, static_cast<std::ptrdiff_t>(4) * width);
+}
+
+std::optional<std::int64_t> Frame::latency() const {
+    const auto code = timeCode();
+    return code ? std::optional(duration_cast<milliseconds>(received.time_since_epoch()).count() - *code)
+                : std::nullopt;
+}
+
+Watcher::Watcher(const std::string& address, const std::string& protocol) {
+    gst_init(nullptr, nullptr);
+    const std::string text = "rtspsrc latency=0 name=in protocols=" + protocol + " ! application/x-rtp,media=video" +
+                             " ! decodebin ! videoconvert name=convert ! video/x-raw,format=RGBA ! "
+                             "appsink name=out sync=false wait-on-eos=false max-buffers=4 drop=true";
+    GstElement* parsed = gst_parse_launch(text.c_str(), nullptr);
+    m_pipeline.reset(GST_ELEMENT(gst_object_ref_sink(parsed)));
+    m_sink.reset(gst_bin_get_by_name(GST_BIN(parsed), "out"));
+    const Object<GstElement> in(gst_bin_get_by_name(GST_BIN(parsed), "in"));
+    g_object_set(in.get(), "location", address.c_str(), nullptr);
+    gst_element_set_state(parsed, GST_STATE_PLAYING);
+}
+
+Watcher::~Watcher() {
+    gst_element_set_state(m_pipeline.get(), GST_STATE_NULL);
+}
+
+std::optional<Frame> Watcher::next(milliseconds deadline) {
+    const Sample sample(gst_app_sink_try_pull_sample(GST_APP_SINK(m_sink.get()), nanoseconds(deadline).count()));
+    if (!sample) {
+        return std::nullopt;
+    }
+    Frame frame;
+    frame.received = system_clock::now();
+    GstVideoInfo info;
+    gst_video_info_from_caps(&info, gst_sample_get_caps(sample.get()));
+    GstVideoFrame mapped;
+    if (gst_video_frame_map(&mapped, &info, gst_sample_get_buffer(sample.get()), GST_MAP_READ) == FALSE) {
+        return std::nullopt;
+    }
+    frame.width = info.width;
+    frame.height = info.height;
+    frame.pixels.resize(static_cast<std::size_t>(4) * info.width * info.height);
+    for (int y = 0; y < info.height; ++y) {
+        std::memcpy(&frame.pixels[static_cast<std::size_t>(4) * y * info.width],
+                    static_cast<const std::uint8_t*>(GST_VIDEO_FRAME_PLANE_DATA(&mapped, 0)) +
+                        static_cast<std::ptrdiff_t>(y) * GST_VIDEO_FRAME_PLANE_STRIDE(&mapped, 0),
+                    static_cast<std::size_t>(4) * info.width);
+    }
+    gst_video_frame_unmap(&mapped);
+    return frame;
+}
+
+std::string Watcher::colorimetry() const {
+    const Object<GstElement> convert(gst_bin_get_by_name(GST_BIN(m_pipeline.get()), "convert"));
+    const Object<GstPad> pad(gst_element_get_static_pad(convert.get(), "sink"));
+    const Caps caps(gst_pad_get_current_caps(pad.get()));
+    const char* text = caps ? gst_structure_get_string(gst_caps_get_structure(caps.get(), 0), "colorimetry") : nullptr;
+    return text != nullptr ? text : "";
+}
+
+bool Watcher::waitForEnd(milliseconds deadline) {
+    const Object<GstBus> bus(gst_element_get_bus(m_pipeline.get()));
+    const Message message(gst_bus_timed_pop_filtered(bus.get(), nanoseconds(deadline).count(),
+                                                     static_cast<GstMessageType>(GST_MESSAGE_EOS | GST_MESSAGE_ERROR)));
+    return message != nullptr;
+}
+
+} // namespace qivo::test

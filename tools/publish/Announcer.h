@@ -1,0 +1,39 @@
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace qivo {
+
+/** A source as the network hears of it. */
+struct Announcement {
+    std::string machine;
+    std::string source;
+    std::string path; ///< of the full stream, begins with "/"
+    std::string low;  ///< of the low-bandwidth stream
+    std::string web;  ///< empty: none
+};
+
+/** Announces sources by multicast DNS as `_rtsp._tcp`, with a stack of its own that needs no daemon. It has a thread of
+ *  its own, on which `say` is called with lines for the user. Destruction says goodbye to the network. */
+class Announcer {
+  public:
+    using Say = std::function<void(const std::string&)>;
+
+    Announcer(std::vector<Announcement> announcements, std::uint16_t port, bool loopbackOnly, Say say);
+    ~Announcer();
+    Announcer(const Announcer&) = delete;
+    Announcer& operator=(const Announcer&) = delete;
+
+    /** Begins. Empty, or one line that says why nothing can be announced. */
+    [[nodiscard]] std::string start();
+
+  private:
+    class Implementation;
+    std::unique_ptr<Implementation> m_implementation;
+};
+
+} // namespace qivo

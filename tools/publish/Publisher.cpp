@@ -1,0 +1,161 @@
+#include "tools/publish/Publisher.h"
+
+#include "tools/publish/Input.h"
+#include "tools/publish/Names.h"
+
+#include <cstdio>
+#include <set>
+
+namespace qivo {
+namespace {
+
+void say(const std::string& text) {
+    std::fprintf(stderr, "qivo-publish: %s\n", text.c_str());
+}
+
+PictureFormat formatOf(PictureSize size, PictureRate rate, Codec codec) {
+    return {size, rate, codec == Codec::mjpeg ? jpegColours : colourSpaceFor(size.height)};
+}
+
+// Where each source's pictures come from: the test picture where there is no input.
+MakePictures testPictures(const PictureFormat& format, TestPictureLook look) {
+    look.space = format.space;
+    return [format, look] { return std::make_unique<TestPictureSource>(format, look); };
+}
+
+MakePictures inputPictures(const std::shared_ptr<Input>& input, Input::Branch branch, const TestPictureLook& look) {
+    return [input, branch, look] { return Input::watch(input, branch, look); };
+}
+
+// What is heard in a source's streams: its tone, or its input's sound; nothing where there is none.
+std::optional<StreamSound> soundOf(const SourceOptions& source, std::size_t number, const InputPlace& place,
+                                   const std::shared_ptr<Input>& input, Input::Branch branch) {
+    if (!source.audio || (input && !place.sound)) {
+        return std::nullopt;
+    }
+    const SoundFormat format{source.audioRate, source.audioChannels};
+    if (input) {
+        return StreamSound{format, source.audioCodec, [input, branch] { return Input::listen(input, branch); }};
+    }
+    return StreamSound{format, source.audioCodec,
+                       [format, number] { return std::make_unique<ToneSource>(format, number); }};
+}
+
+std::string missingElement(const std::vector<SourceOptions>& sources) {
+    for (const SourceOptions& source : sources) {
+        std::vector<NeededElement> elements = elementsFor(source.codec);
+        if (!source.input.empty()) {
+            const auto more = elementsFor(placeOf(source.input).kind);
+            elements.insert(elements.end(), more.begin(), more.end());
+        }
+        if (source.audio) {
+            const auto more = elementsFor(source.audioCodec);
+            elements.insert(elements.end(), more.begin(), more.end());
+        }
+        for (const NeededElement& element : elements) {
+            const Object<GstElementFactory> factory(gst_element_factory_find(element.name));
+            if (!factory) {
+                return std::string("the GStreamer element ") + element.name +
+                       " is missing; install the Debian package " + element.package;
+            }
+        }
+    }
+    return {};
+}
+
+} // namespace
+
+std::string fullPath(std::size_t number) {
+    return "/source-" + std::to_string(number + 1);
+}
+
+std::string lowPath(std::size_t number) {
+    return fullPath(number) + "/low";
+}
+
+Publisher::Publisher(Options options) : m_options(std::move(options)) {}
+
+Publisher::~Publisher() = default;
+
+std::string Publisher::start() {
+    if (std::string problem = missingElement(m_options.sources); !problem.empty()) {
+        return problem;
+    }
+    if (std::string problem = findInputs(); !problem.empty()) {
+        return problem;
+    }
+    mountSources();
+    if (std::string problem = m_server.listen(m_options.port, m_options.loopbackOnly); !problem.empty()) {
+        return problem;
+    }
+    printAddresses();
+    announce();
+    return {};
+}
+
+std::string Publisher::findInputs() {
+    for (const SourceOptions& source : m_options.sources) {
+        m_places.push_back(placeOf(source.input));
+        if (source.input.empty()) {
+            continue;
+        }
+        if (std::string problem = inputProblem(m_places.back()); !problem.empty()) {
+            return problem;
+        }
+    }
+    return {};
+}
+
+void Publisher::mountSources() {
+    for (std::size_t i = 0; i < m_options.sources.size(); ++i) {
+        const SourceOptions& source = m_options.sources[i];
+        const TestPictureLook look{source.name, {}, i, {}};
+        const PictureFormat full = formatOf(source.size, source.rate, source.codec);
+        const PictureFormat low = formatOf(source.lowSize, source.lowRate, source.codec);
+        MakePictures fullPictures = testPictures(full, look);
+        MakePictures lowPictures = testPictures(low, look);
+        std::shared_ptr<Input> input;
+        if (!source.input.empty()) {
+            const auto sound =
+                source.audio ? std::optional(SoundFormat{source.audioRate, source.audioChannels}) : std::nullopt;
+            input = std::make_shared<Input>(m_places[i], full, low, sound, say);
+            fullPictures = inputPictures(input, Input::Branch::full, look);
+            lowPictures = inputPictures(input, Input::Branch::low, look);
+        }
+        m_server.mount(fullPath(i), makeStreamFactory(full, source.codec, std::move(fullPictures),
+                                                      soundOf(source, i, m_places[i], input, Input::Branch::full)));
+        m_server.mount(lowPath(i), makeStreamFactory(low, source.codec, std::move(lowPictures),
+                                                     soundOf(source, i, m_places[i], input, Input::Branch::low)));
+    }
+}
+
+void Publisher::printAddresses() const {
+    const std::string host = m_options.loopbackOnly ? "127.0.0.1" : reachableAddress();
+    const std::string start = "rtsp://" + host + ":" + std::to_string(m_server.port());
+    for (std::size_t i = 0; i < m_options.sources.size(); ++i) {
+        const std::string name = instanceName(m_options.machine, m_options.sources[i].name);
+        std::printf("%s%s  %s\n", start.c_str(), fullPath(i).c_str(), name.c_str());
+        std::printf("%s%s  %s, low bandwidth\n", start.c_str(), lowPath(i).c_str(), name.c_str());
+    }
+    std::fflush(stdout);
+}
+
+void Publisher::announce() {
+    std::vector<Announcement> announcements;
+    for (std::size_t i = 0; i < m_options.sources.size(); ++i) {
+        const SourceOptions& source = m_options.sources[i];
+        announcements.push_back({m_options.machine, source.name, fullPath(i), lowPath(i), source.web});
+    }
+    m_announcer = std::make_unique<Announcer>(std::move(announcements), static_cast<std::uint16_t>(m_server.port()),
+                                              m_options.loopbackOnly, say);
+    if (const std::string problem = m_announcer->start(); !problem.empty()) {
+        say(problem + "; the addresses above are served all the same");
+    }
+}
+
+void Publisher::stop() {
+    m_announcer.reset();
+    m_server.stop();
+}
+
+} // namespace qivo

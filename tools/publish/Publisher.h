@@ -1,0 +1,48 @@
+#pragma once
+
+#include "tools/publish/Announcer.h"
+#include "tools/publish/Input.h"
+#include "tools/publish/Options.h"
+#include "tools/publish/RtspServer.h"
+
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace qivo {
+
+/** Serves and announces every source that the options ask for. Lives on the thread of the default main context, which
+ *  must run for it to serve. */
+class Publisher {
+  public:
+    explicit Publisher(Options options);
+    ~Publisher();
+    Publisher(const Publisher&) = delete;
+    Publisher& operator=(const Publisher&) = delete;
+
+    /** Checks that everything is there, begins to serve, prints the addresses on standard output, then announces.
+     * Empty, or one line that says what is in the way; then nothing has begun. */
+    [[nodiscard]] std::string start();
+
+    /** Says goodbye to the network and to the viewers. */
+    void stop();
+
+  private:
+    [[nodiscard]] std::string findInputs();
+    void mountSources();
+    void printAddresses() const;
+    void announce();
+
+    Options m_options;
+    std::vector<InputPlace> m_places; // of each source
+    RtspServer m_server;
+    std::unique_ptr<Announcer> m_announcer;
+};
+
+/** The path of a source's full stream: its number, counted from 0, decides. */
+[[nodiscard]] std::string fullPath(std::size_t number);
+
+/** The path of its low-bandwidth stream. */
+[[nodiscard]] std::string lowPath(std::size_t number);
+
+} // namespace qivo
