@@ -6,14 +6,14 @@ add_library(qivo_receiver_fixture STATIC CountingAllocator.cpp CountingAllocator
                                          RawServer.cpp RawServer.h)
 target_link_libraries(qivo_receiver_fixture PUBLIC qivo_runtime PkgConfig::GSTRTSPSERVER GTest::gtest)
 
-qivo_test(receiver-streams SOURCES ReceiverStreamTest.cpp LIBRARIES qivo_receiver_fixture NETWORK SERIAL
+qivo_test(receiver-streams SOURCES ReceiverStreamTest.cpp LIBRARIES qivo_receiver_fixture NETWORK BUSY
           ENVIRONMENT ${unwind})
 qivo_test(receiver-hostile SOURCES ReceiverHostileTest.cpp LIBRARIES qivo_receiver_fixture NETWORK
           ENVIRONMENT ${unwind})
-qivo_test(receiver-healing SOURCES ReceiverHealingTest.cpp LIBRARIES qivo_receiver_fixture NETWORK SERIAL
+qivo_test(receiver-healing SOURCES ReceiverHealingTest.cpp LIBRARIES qivo_receiver_fixture NETWORK BUSY
           ENVIRONMENT ${unwind})
 qivo_test(sound-parts SOURCES SoundQueueTest.cpp LIBRARIES qivo_runtime TSAN)
-qivo_test(receiver-sound SOURCES ReceiverSoundTest.cpp LIBRARIES qivo_receiver_fixture qivo_test_tone NETWORK SERIAL
+qivo_test(receiver-sound SOURCES ReceiverSoundTest.cpp LIBRARIES qivo_receiver_fixture qivo_test_tone NETWORK BUSY
           ENVIRONMENT ${unwind} TIMEOUT 120)
 qivo_test(receiver-parts SOURCES ReceiverPartsTest.cpp LIBRARIES qivo_runtime TSAN)
 

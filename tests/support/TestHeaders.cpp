@@ -1,0 +1,1 @@
+// Nothing but the occasion on which the test framework's headers are compiled.
