@@ -61,7 +61,7 @@ class Camera {
     using Clock = std::function<Time()>;
 
     /** Units a second at full speed. */
-    static constexpr double turnRate = 1.0;
+    static constexpr double turnRate = 0.5;
     static constexpr double zoomRate = 0.5;
     static constexpr double focusRate = 0.5;
 
@@ -75,7 +75,7 @@ class Camera {
     /** The focus at which everything is sharp; the automatic finds it. */
     static constexpr double sharpFocus = 0.5;
 
-    /** Stands in the middle, half-way zoomed out, in automatic focus. */
+    /** Stands in the middle, zoomed out, in automatic focus. */
     explicit Camera(Clock clock = std::chrono::steady_clock::now);
     Camera(const Camera&) = delete;
     Camera& operator=(const Camera&) = delete;
@@ -146,8 +146,9 @@ class Camera {
         void go(double destination, double newSpeed);
     };
 
+    // All under m_mutex.
     void advance() const;
-    [[nodiscard]] int numberOf(const std::string& token) const;
+    void go(const std::optional<PanTilt>& direction, std::optional<double> zoom, PanTilt turnSpeed, double zoomSpeed);
 
     const Clock m_clock;
     mutable std::mutex m_mutex;
