@@ -18,9 +18,19 @@ PictureFormat formatOf(PictureSize size, PictureRate rate, Codec codec) {
 }
 
 // Where each source's pictures come from: the test picture where there is no input.
-MakePictures testPictures(const PictureFormat& format, TestPictureLook look) {
-    look.space = format.space;
-    return [format, look] { return std::make_unique<TestPictureSource>(format, look); };
+MakePictures testPictures(const PictureFormat& format, const TestPictureLook& look) {
+    return [format, look] { return std::make_unique<DrawnPictureSource>(format, drawTestPicture(format, look)); };
+}
+
+MakePictures cameraPictures(const PictureFormat& format, const CameraPicture::Look& look,
+                            const std::shared_ptr<const Camera>& camera) {
+    return [format, look, camera] {
+        const auto picture = std::make_shared<CameraPicture>(format.size, format.space, look, camera);
+        return std::make_unique<DrawnPictureSource>(
+            format, [picture](const PicturePlanes& planes, std::chrono::system_clock::time_point time) {
+                picture->draw(planes, time);
+            });
+    };
 }
 
 MakePictures inputPictures(const std::shared_ptr<Input>& input, Input::Branch branch, const TestPictureLook& look) {
