@@ -122,8 +122,10 @@ int openAddressNews() {
 Strings textRecords(const Announcement& announcement) {
     Strings strings(avahi_string_list_add_pair(nullptr, "path", announcement.path.c_str()));
     strings.reset(avahi_string_list_add_pair(strings.release(), "low", announcement.low.c_str()));
-    if (!announcement.web.empty()) {
-        strings.reset(avahi_string_list_add_pair(strings.release(), "web", announcement.web.c_str()));
+    for (const auto& [key, value] : {std::pair{"web", &announcement.web}, std::pair{"onvif", &announcement.onvif}}) {
+        if (!value->empty()) {
+            strings.reset(avahi_string_list_add_pair(strings.release(), key, value->c_str()));
+        }
     }
     return strings;
 }
