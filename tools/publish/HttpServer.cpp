@@ -20,14 +20,10 @@ int portOf(GSocketAddress* address) {
     return G_IS_INET_SOCKET_ADDRESS(address) ? g_inet_socket_address_get_port(G_INET_SOCKET_ADDRESS(address)) : 0;
 }
 
-std::string methodOf(SoupServerMessage* message) {
-    const std::string method = soup_server_message_get_method(message);
-    return method == "HEAD" ? "GET" : method;
-}
-
 HttpRequest requestOf(SoupServerMessage* message) {
     HttpRequest request;
-    request.method = methodOf(message);
+    request.sentMethod = soup_server_message_get_method(message);
+    request.method = request.sentMethod == "HEAD" ? "GET" : request.sentMethod;
     GUri* uri = soup_server_message_get_uri(message);
     request.path = g_uri_get_path(uri);
     request.query = g_uri_get_query(uri) != nullptr ? g_uri_get_query(uri) : "";

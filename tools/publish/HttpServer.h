@@ -30,7 +30,8 @@ struct HttpPatience {
 
 /** A whole request, as a handler sees it. */
 struct HttpRequest {
-    std::string method; ///< "GET", "POST" and so on; a HEAD comes as "GET"
+    std::string method;     ///< "GET", "POST" and so on; a HEAD comes as "GET"
+    std::string sentMethod; ///< as it was sent
     std::string
         path; ///< as sent, normalised: no dot segments, nothing percent-encoded that need not be; begins with "/"
     std::string query; ///< without "?", as sent; empty if there is none
