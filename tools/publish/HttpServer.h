@@ -114,8 +114,8 @@ class HttpServer {
 
     HttpPatience m_patience;
     std::shared_ptr<HttpServer*> m_self = std::make_shared<HttpServer*>(this); // for replies that outlive the server
-    std::map<std::string, std::map<std::string, HttpHandler>> m_routes; // by path, then method
-    std::map<GObject*, Connection> m_connections;                       // by stream
+    std::map<std::string, std::map<std::string, HttpHandler>> m_routes;        // by path, then method
+    std::map<GObject*, Connection> m_connections;                              // by stream
     Object<SoupServer> m_server;
     Object<GSocketService> m_listener;
     int m_port = 0;
