@@ -1,7 +1,7 @@
 #include "tools/publish/HttpServer.h"
 
 #include <algorithm>
-#include <optional>
+#include <array>
 
 namespace qivo {
 namespace {
@@ -85,27 +85,29 @@ std::string HttpRequest::header(std::string_view name) const {
     return all;
 }
 
-// Outlives neither the message's life at the server ("finished") nor its answer.
 struct HttpReply::Exchange {
-    Object<SoupServerMessage> message;
+    Object<SoupServerMessage> message; // until it is answered or its connection gone
     std::function<void(SoupServerMessage*)> sent;
-    gulong handler = 0;
+    std::array<gulong, 2> handlers{};
 
     ~Exchange() { release(); }
     void release() {
         if (message) {
-            g_signal_handler_disconnect(message.get(), handler);
+            for (const gulong handler : handlers) {
+                g_signal_handler_disconnect(message.get(), handler);
+            }
             message.reset();
         }
     }
 };
 
 HttpReply::HttpReply(SoupServerMessage* message, std::function<void(SoupServerMessage*)> sent)
-    : m_exchange(std::make_shared<Exchange>()) {
+    : m_exchange(std::make_unique<Exchange>()) {
     m_exchange->message = share(message);
     m_exchange->sent = std::move(sent);
-    const auto finished = +[](SoupServerMessage*, gpointer exchange) { static_cast<Exchange*>(exchange)->release(); };
-    m_exchange->handler = g_signal_connect(message, "finished", G_CALLBACK(finished), m_exchange.get());
+    const auto over = +[](SoupServerMessage*, gpointer exchange) { static_cast<Exchange*>(exchange)->release(); };
+    m_exchange->handlers = {g_signal_connect(message, "finished", G_CALLBACK(over), m_exchange.get()),
+                            g_signal_connect(message, "disconnected", G_CALLBACK(over), m_exchange.get())};
     soup_server_message_pause(message);
 }
 
@@ -121,44 +123,41 @@ HttpReply& HttpReply::operator=(HttpReply&& other) noexcept {
     return *this;
 }
 
-void HttpReply::send(HttpResponse response) {
+void HttpReply::send(const HttpResponse& response) {
     if (!m_exchange || !m_exchange->message) {
         return;
     }
     const Object<SoupServerMessage> message = share(m_exchange->message.get());
     m_exchange->release();
     write(message.get(), response);
-    if (m_exchange->sent) {
-        m_exchange->sent(message.get());
-    }
+    m_exchange->sent(message.get());
     soup_server_message_unpause(message.get());
 }
 
 HttpServer::HttpServer(HttpPatience patience)
     : m_patience(patience),
       m_server(SOUP_SERVER(g_object_new(SOUP_TYPE_SERVER, "server-header", "qivo-publish", nullptr))) {
-    const auto early = +[](SoupServer*, SoupServerMessage* message, const char*, GHashTable*, gpointer self) {
-        static_cast<HttpServer*>(self)->beginRequest(message);
+    const auto started = +[](SoupServer*, SoupServerMessage* message, gpointer self) {
+        static_cast<HttpServer*>(self)->awaitRequest(message);
+    };
+    const auto head = +[](SoupServer*, SoupServerMessage* message, const char*, GHashTable*, gpointer self) {
+        static_cast<HttpServer*>(self)->bound(message);
     };
     const auto whole = +[](SoupServer*, SoupServerMessage* message, const char*, GHashTable*, gpointer self) {
         static_cast<HttpServer*>(self)->answer(message);
     };
-    const auto finished = +[](SoupServer*, SoupServerMessage* message, gpointer data) {
-        auto* self = static_cast<HttpServer*>(data);
-        self->giveTime(message, self->m_patience.request);
-    };
-    soup_server_add_early_handler(m_server.get(), nullptr, early, this, nullptr);
+    g_signal_connect(m_server.get(), "request-started", G_CALLBACK(started), this);
+    soup_server_add_early_handler(m_server.get(), nullptr, head, this, nullptr);
     soup_server_add_handler(m_server.get(), nullptr, whole, this, nullptr);
-    g_signal_connect(m_server.get(), "request-finished", G_CALLBACK(finished), this);
 }
 
 HttpServer::~HttpServer() {
     stop();
-    for (auto& [stream, connection] : m_connections) {
-        endTime(connection);
-        g_object_weak_unref(stream, onGone, this);
-    }
     g_signal_handlers_disconnect_by_data(m_server.get(), this);
+    for (auto& [socket, connection] : m_connections) {
+        g_object_weak_unref(G_OBJECT(socket), onGone, this);
+        endTime(connection);
+    }
 }
 
 void HttpServer::route(const std::string& method, const std::string& path, HttpHandler handler) {
@@ -168,80 +167,61 @@ void HttpServer::route(const std::string& method, const std::string& path, HttpH
 bool HttpServer::bind(int port, bool loopbackOnly, std::string& reason) {
     const Object<GSocketAddress> wanted(
         g_inet_socket_address_new_from_string(loopbackOnly ? "127.0.0.1" : "0.0.0.0", static_cast<guint>(port)));
-    GSocketAddress* bound = nullptr;
     GError* failure = nullptr;
     const bool done =
-        g_socket_listener_add_address(G_SOCKET_LISTENER(m_listener.get()), wanted.get(), G_SOCKET_TYPE_STREAM,
-                                      G_SOCKET_PROTOCOL_TCP, nullptr, &bound, &failure) != FALSE;
+        soup_server_listen(m_server.get(), wanted.get(), static_cast<SoupServerListenOptions>(0), &failure) != FALSE;
     const Error error(failure);
-    const Object<GSocketAddress> address(bound);
     if (!done) {
         reason = error ? error->message : "unknown reason";
         return false;
     }
-    m_port = portOf(address.get());
+    const std::unique_ptr<GSList, void (*)(GSList*)> listeners(soup_server_get_listeners(m_server.get()), g_slist_free);
+    const Object<GSocketAddress> bound(g_socket_get_local_address(static_cast<GSocket*>(listeners->data), nullptr));
+    m_port = portOf(bound.get());
     return true;
 }
 
 std::string HttpServer::listen(int port, int preferred, bool loopbackOnly) {
-    m_listener.reset(g_socket_service_new());
-    const auto incoming = +[](GSocketService*, GSocketConnection* stream, GObject*, gpointer self) -> gboolean {
-        static_cast<HttpServer*>(self)->accept(stream);
-        return TRUE;
-    };
-    g_signal_connect(m_listener.get(), "incoming", G_CALLBACK(incoming), this);
     std::string reason;
     const bool anyWillDo = port < 0;
     if (bind(anyWillDo ? preferred : port, loopbackOnly, reason) || (anyWillDo && bind(0, loopbackOnly, reason))) {
         return {};
     }
-    m_listener.reset();
     return "cannot serve web pages at port " + std::to_string(port) + ": " + reason;
 }
 
 void HttpServer::stop() {
-    if (m_listener) {
-        g_signal_handlers_disconnect_by_data(m_listener.get(), this);
-        g_socket_service_stop(m_listener.get());
-        g_socket_listener_close(G_SOCKET_LISTENER(m_listener.get()));
-        m_listener.reset();
-    }
     soup_server_disconnect(m_server.get());
     m_port = 0;
 }
 
-void HttpServer::accept(GSocketConnection* stream) {
-    const Object<GSocketAddress> remote(g_socket_connection_get_remote_address(stream, nullptr));
-    const Object<GSocketAddress> local(g_socket_connection_get_local_address(stream, nullptr));
-    const std::string address = addressOf(remote.get());
-    const auto ofOne = static_cast<std::size_t>(
-        std::count_if(m_connections.begin(), m_connections.end(),
-                      [&address](const auto& entry) { return entry.second.address == address; }));
-    if (!remote || !local || m_connections.size() >= maximumHttpConnections || ofOne >= maximumHttpConnectionsOfOne) {
-        g_io_stream_close(G_IO_STREAM(stream), nullptr, nullptr);
-        return;
+// A connection's first request starts with the connection, before a byte of it has come.
+void HttpServer::awaitRequest(SoupServerMessage* message) {
+    GSocket* socket = soup_server_message_get_socket(message);
+    const std::string address = addressOf(soup_server_message_get_remote_address(message));
+    if (m_connections.count(socket) == 0) {
+        const auto ofOne = std::count_if(m_connections.begin(), m_connections.end(),
+                                         [&address](const auto& entry) { return entry.second.address == address; });
+        if (m_connections.size() >= maximumHttpConnections ||
+            static_cast<std::size_t>(ofOne) >= maximumHttpConnectionsOfOne) {
+            g_socket_shutdown(socket, TRUE, TRUE, nullptr);
+            return;
+        }
+        m_connections[socket].address = address;
+        g_object_weak_ref(G_OBJECT(socket), onGone, this);
     }
-    Connection& connection = m_connections[G_OBJECT(stream)];
-    connection = {stream, remote.get(), address, 0};
-    g_object_weak_ref(G_OBJECT(stream), onGone, this);
-    giveTime(connection, m_patience.request);
-    soup_server_accept_iostream(m_server.get(), G_IO_STREAM(stream), local.get(), remote.get(), nullptr);
+    giveTime(message, m_patience.request);
 }
 
-void HttpServer::onGone(gpointer server, GObject* stream) {
+void HttpServer::onGone(gpointer server, GObject* socket) {
     auto& connections = static_cast<HttpServer*>(server)->m_connections;
-    const auto found = connections.find(stream);
+    const auto found = std::find_if(connections.begin(), connections.end(), [socket](const auto& entry) {
+        return static_cast<const void*>(entry.first) == socket;
+    });
     if (found != connections.end()) {
         endTime(found->second);
         connections.erase(found);
     }
-}
-
-HttpServer::Connection* HttpServer::connectionOf(SoupServerMessage* message) {
-    const GSocketAddress* remote = soup_server_message_get_remote_address(message);
-    const auto found = std::find_if(m_connections.begin(), m_connections.end(),
-                                    [remote](const auto& entry) { return entry.second.remote == remote; });
-    return found == m_connections.end() ? nullptr : &found->second;
 }
 
 void HttpServer::endTime(Connection& connection) {
@@ -251,52 +231,58 @@ void HttpServer::endTime(Connection& connection) {
     }
 }
 
-void HttpServer::giveTime(Connection& connection, std::chrono::milliseconds time) {
-    endTime(connection);
+void HttpServer::giveTime(SoupServerMessage* message, std::chrono::milliseconds time) {
+    const auto found = m_connections.find(soup_server_message_get_socket(message));
+    if (found == m_connections.end()) {
+        return;
+    }
+    endTime(found->second);
+    using Entry = decltype(m_connections)::value_type;
     const auto over = [](gpointer data) -> gboolean {
-        auto* late = static_cast<Connection*>(data);
-        late->timer = 0;
+        auto& [socket, connection] = *static_cast<Entry*>(data);
+        connection.timer = 0;
         // libsoup reads the end of the stream and closes what is its own.
-        g_socket_shutdown(g_socket_connection_get_socket(late->stream), TRUE, TRUE, nullptr);
+        g_socket_shutdown(socket, TRUE, TRUE, nullptr);
         return G_SOURCE_REMOVE;
     };
-    connection.timer = g_timeout_add(static_cast<guint>(time.count()), over, &connection);
+    found->second.timer = g_timeout_add(static_cast<guint>(time.count()), over, &*found);
 }
 
-void HttpServer::giveTime(SoupServerMessage* message, std::chrono::milliseconds time) {
-    if (Connection* connection = connectionOf(message)) {
-        giveTime(*connection, time);
-    }
-}
-
-void HttpServer::beginRequest(SoupServerMessage* message) {
+void HttpServer::bound(SoupServerMessage* message) {
     SoupMessageHeaders* headers = soup_server_message_get_request_headers(message);
     if (soup_message_headers_get_encoding(headers) == SOUP_ENCODING_CONTENT_LENGTH) {
         const goffset length = soup_message_headers_get_content_length(headers);
         if (length < 0 || static_cast<std::size_t>(length) > maximumHttpRequestBytes) {
-            soup_message_headers_replace(soup_server_message_get_response_headers(message), "Connection", "close");
-            write(message, plain(413, "The request is too long."));
+            refuseLength(message);
         }
         return;
     }
-    const auto chunk = +[](SoupServerMessage* from, GBytes* bytes, gpointer self) {
-        static_cast<HttpServer*>(self)->countChunk(from, g_bytes_get_size(bytes));
+    const auto chunk = +[](SoupServerMessage* from, GBytes* bytes, gpointer) {
+        const gsize before = GPOINTER_TO_SIZE(g_object_get_data(G_OBJECT(from), receivedKey));
+        const gsize received = before + g_bytes_get_size(bytes);
+        g_object_set_data(G_OBJECT(from), receivedKey, GSIZE_TO_POINTER(received));
+        if (before <= maximumHttpRequestBytes && received > maximumHttpRequestBytes) {
+            refuseLength(from);
+        }
     };
-    g_signal_connect(message, "got-chunk", G_CALLBACK(chunk), this);
+    g_signal_connect(message, "got-chunk", G_CALLBACK(chunk), nullptr);
 }
 
-void HttpServer::countChunk(SoupServerMessage* message, gsize bytes) {
-    const gsize received = GPOINTER_TO_SIZE(g_object_get_data(G_OBJECT(message), receivedKey)) + bytes;
-    g_object_set_data(G_OBJECT(message), receivedKey, GSIZE_TO_POINTER(received));
-    Connection* connection = connectionOf(message);
-    if (received > maximumHttpRequestBytes && connection != nullptr) {
-        g_socket_shutdown(g_socket_connection_get_socket(connection->stream), TRUE, TRUE, nullptr);
-    }
+// libsoup answers only once it has read the whole body. So the answer goes past it, and what still comes is dropped
+// until the client or its time is at its end; were it left unread, the client might never see the answer.
+void HttpServer::refuseLength(SoupServerMessage* message) {
+    static const std::string refusal =
+        "HTTP/1.1 413 Payload Too Large\r\nConnection: close\r\nContent-Length: 0\r\n\r\n";
+    soup_message_body_set_accumulate(soup_server_message_get_request_body(message), FALSE);
+    soup_server_message_set_status(message, SOUP_STATUS_REQUEST_ENTITY_TOO_LARGE, nullptr);
+    GSocket* socket = soup_server_message_get_socket(message);
+    g_socket_send(socket, refusal.data(), refusal.size(), nullptr, nullptr);
+    g_socket_shutdown(socket, FALSE, TRUE, nullptr);
 }
 
 void HttpServer::answer(SoupServerMessage* message) {
-    if (Connection* connection = connectionOf(message)) {
-        endTime(*connection);
+    if (const auto found = m_connections.find(soup_server_message_get_socket(message)); found != m_connections.end()) {
+        endTime(found->second);
     }
     HttpReply reply(message, [weak = std::weak_ptr<HttpServer*>(m_self)](SoupServerMessage* sent) {
         if (const auto self = weak.lock()) {

@@ -31,9 +31,10 @@ struct HttpPatience {
 /** A whole request, as a handler sees it. */
 struct HttpRequest {
     std::string method; ///< "GET", "POST" and so on; a HEAD comes as "GET"
-    std::string path;   ///< as sent, percent-encodings left alone; begins with "/"
-    std::string query;  ///< without "?", as sent; empty if there is none
-    std::string body;   ///< at most maximumHttpRequestBytes
+    std::string
+        path; ///< as sent, normalised: no dot segments, nothing percent-encoded that need not be; begins with "/"
+    std::string query; ///< without "?", as sent; empty if there is none
+    std::string body;  ///< at most maximumHttpRequestBytes
     std::vector<std::pair<std::string, std::string>> headers;
     std::string localAddress; ///< at which the client reached this machine, for instance "192.168.1.7"
     int localPort = 0;
@@ -53,17 +54,17 @@ struct HttpResponse {
 /** The one answer to a request, now or later, on the server's thread. One that is let go unsent answers 500. */
 class HttpReply {
   public:
-    explicit HttpReply(SoupServerMessage* message, std::function<void(SoupServerMessage*)> sent = {});
+    explicit HttpReply(SoupServerMessage* message, std::function<void(SoupServerMessage*)> sent);
     ~HttpReply();
     HttpReply(HttpReply&& other) noexcept;
     HttpReply& operator=(HttpReply&& other) noexcept;
 
     /** Sends it. Does nothing once the client or the server is gone, nor a second time. */
-    void send(HttpResponse response);
+    void send(const HttpResponse& response);
 
   private:
     struct Exchange;
-    std::shared_ptr<Exchange> m_exchange;
+    std::unique_ptr<Exchange> m_exchange;
 };
 
 using HttpHandler = std::function<void(const HttpRequest& request, HttpReply reply)>;
@@ -94,30 +95,25 @@ class HttpServer {
 
   private:
     struct Connection {
-        GSocketConnection* stream = nullptr; // owned by libsoup; gone from the table when it is
-        GSocketAddress* remote = nullptr;    // owned by the stream
         std::string address;
-        guint timer = 0;
+        guint timer = 0; // closes it
     };
 
     [[nodiscard]] bool bind(int port, bool loopbackOnly, std::string& reason);
-    void accept(GSocketConnection* stream);
-    static void onGone(gpointer server, GObject* stream);
-    [[nodiscard]] Connection* connectionOf(SoupServerMessage* message);
-    void giveTime(Connection& connection, std::chrono::milliseconds time);
+    void awaitRequest(SoupServerMessage* message);
+    static void onGone(gpointer server, GObject* socket);
     void giveTime(SoupServerMessage* message, std::chrono::milliseconds time);
     static void endTime(Connection& connection);
-    void beginRequest(SoupServerMessage* message);
-    void countChunk(SoupServerMessage* message, gsize bytes);
+    static void bound(SoupServerMessage* message);
+    static void refuseLength(SoupServerMessage* message);
     void answer(SoupServerMessage* message);
     [[nodiscard]] HttpResponse refusal(const std::string& path) const;
 
     HttpPatience m_patience;
     std::shared_ptr<HttpServer*> m_self = std::make_shared<HttpServer*>(this); // for replies that outlive the server
     std::map<std::string, std::map<std::string, HttpHandler>> m_routes;        // by path, then method
-    std::map<GObject*, Connection> m_connections;                              // by stream
+    std::map<GSocket*, Connection> m_connections;                              // libsoup's; each leaves with its end
     Object<SoupServer> m_server;
-    Object<GSocketService> m_listener;
     int m_port = 0;
 };
 
