@@ -229,6 +229,9 @@ Problem sourceProblem(const std::string& machine, const SourceOptions& source) {
     if (source.ptz && !source.input.empty()) {
         return "source \"" + source.name + "\": --ptz and --input both say what is shown; leave out one";
     }
+    if (source.ptz && source.codec == Codec::h265) {
+        return "source \"" + source.name + "\": ONVIF names no H.265; steer a camera with --codec h264 or mjpeg";
+    }
     const int largest = std::max({source.size.width, source.size.height, source.lowSize.width, source.lowSize.height});
     if (source.codec == Codec::mjpeg && largest > maximumJpegSize) {
         return "source \"" + source.name + "\": --codec mjpeg carries at most " + std::to_string(maximumJpegSize) +

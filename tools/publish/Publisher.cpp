@@ -2,6 +2,7 @@
 
 #include "tools/publish/CameraPicture.h"
 #include "tools/publish/Input.h"
+#include "tools/publish/LocalAddresses.h"
 #include "tools/publish/Names.h"
 
 #include <algorithm>
@@ -148,7 +149,28 @@ std::string Publisher::serveSteering() {
     if (std::none_of(m_cameras.begin(), m_cameras.end(), [](const auto& camera) { return camera != nullptr; })) {
         return {};
     }
+    std::vector<OnvifCamera> cameras;
+    for (std::size_t i = 0; i < m_cameras.size(); ++i) {
+        if (m_cameras[i]) {
+            cameras.push_back(onvifCamera(i));
+        }
+    }
+    m_onvif = std::make_unique<OnvifServer>(m_http, std::move(cameras));
     return m_http.listen(m_options.httpPort, preferredHttpPort, m_options.loopbackOnly);
+}
+
+OnvifCamera Publisher::onvifCamera(std::size_t number) const {
+    const SourceOptions& source = m_options.sources[number];
+    const PictureFormat full = formatOf(source.size, source.rate, source.codec);
+    const PictureFormat low = formatOf(source.lowSize, source.lowRate, source.codec);
+    const std::string service = onvifPath(number);
+    return {m_options.machine,
+            source.name,
+            service.substr(0, service.rfind('/') + 1),
+            m_cameras[number],
+            {{"full", "Full", fullPath(number), full.size, full.rate, source.codec, bitRateFor(full)},
+             {"low", "Low bandwidth", lowPath(number), low.size, low.rate, source.codec, bitRateFor(low)}},
+            m_server.port()};
 }
 
 void Publisher::mountSources() {
@@ -209,10 +231,14 @@ void Publisher::announce() {
     if (const std::string problem = m_announcer->start(); !problem.empty()) {
         say(problem + "; the addresses above are served all the same");
     }
+    if (const std::string problem = m_onvif ? m_onvif->announce(m_options.loopbackOnly) : ""; !problem.empty()) {
+        say(problem + "; they can be steered all the same");
+    }
 }
 
 void Publisher::stop() {
     m_announcer.reset();
+    m_onvif.reset();
     m_http.stop();
     m_server.stop();
 }

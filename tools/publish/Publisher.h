@@ -6,6 +6,7 @@
 #include "tools/publish/Input.h"
 #include "tools/publish/Options.h"
 #include "tools/publish/RtspServer.h"
+#include "tools/publish/onvif/OnvifServer.h"
 
 #include <memory>
 #include <string>
@@ -35,6 +36,7 @@ class Publisher {
     void mountSources();
     [[nodiscard]] MakePictures picturesOf(std::size_t number, const PictureFormat& format) const;
     [[nodiscard]] std::string serveSteering();
+    [[nodiscard]] OnvifCamera onvifCamera(std::size_t number) const;
     [[nodiscard]] std::string httpAddress(const std::string& path) const;
     [[nodiscard]] std::string webAddress(std::size_t number) const;
     void printAddresses() const;
@@ -46,6 +48,7 @@ class Publisher {
     std::string m_host;                             // at which this machine is reached
     RtspServer m_server;
     HttpServer m_http; // listens where there are cameras
+    std::unique_ptr<OnvifServer> m_onvif;
     std::unique_ptr<Announcer> m_announcer;
 };
 
