@@ -105,6 +105,10 @@ std::string Publisher::start() {
     if (std::string problem = findInputs(); !problem.empty()) {
         return problem;
     }
+    if (m_options.login) {
+        m_login = std::make_shared<HttpLogin>(*m_options.login);
+        m_server.requireLogin(*m_options.login);
+    }
     makeCameras();
     mountSources();
     if (std::string problem = m_server.listen(m_options.port, m_options.loopbackOnly); !problem.empty()) {
@@ -155,7 +159,7 @@ std::string Publisher::serveSteering() {
             cameras.push_back(onvifCamera(i));
         }
     }
-    m_onvif = std::make_unique<OnvifServer>(m_http, std::move(cameras));
+    m_onvif = std::make_unique<OnvifServer>(m_http, std::move(cameras), m_login);
     return m_http.listen(m_options.httpPort, preferredHttpPort, m_options.loopbackOnly);
 }
 

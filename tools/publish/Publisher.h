@@ -46,6 +46,7 @@ class Publisher {
     std::vector<InputPlace> m_places;               // of each source
     std::vector<std::shared_ptr<Camera>> m_cameras; // of each source; null where there is none to steer
     std::string m_host;                             // at which this machine is reached
+    std::shared_ptr<HttpLogin> m_login;             // null where none is needed
     RtspServer m_server;
     HttpServer m_http; // listens where there are cameras
     std::unique_ptr<OnvifServer> m_onvif;

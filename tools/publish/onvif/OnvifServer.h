@@ -1,6 +1,7 @@
 #pragma once
 
 #include "tools/publish/HttpServer.h"
+#include "tools/publish/Login.h"
 #include "tools/publish/onvif/Onvif.h"
 #include "tools/publish/onvif/WsDiscovery.h"
 
@@ -14,8 +15,8 @@ namespace qivo {
  * main context, no longer than the HTTP server. */
 class OnvifServer {
   public:
-    /** Adds the services to `http`. */
-    OnvifServer(HttpServer& http, std::vector<OnvifCamera> cameras);
+    /** Adds the services to `http`. With a login they want it as HTTP digest or as WS-Security token. */
+    OnvifServer(HttpServer& http, std::vector<OnvifCamera> cameras, const std::shared_ptr<HttpLogin>& login);
     OnvifServer(const OnvifServer&) = delete;
     OnvifServer& operator=(const OnvifServer&) = delete;
 
