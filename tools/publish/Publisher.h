@@ -7,6 +7,7 @@
 #include "tools/publish/Options.h"
 #include "tools/publish/RtspServer.h"
 #include "tools/publish/onvif/OnvifServer.h"
+#include "tools/publish/page/ControlPage.h"
 
 #include <memory>
 #include <string>
@@ -37,6 +38,7 @@ class Publisher {
     [[nodiscard]] MakePictures picturesOf(std::size_t number, const PictureFormat& format) const;
     [[nodiscard]] std::string serveSteering();
     [[nodiscard]] OnvifCamera onvifCamera(std::size_t number) const;
+    [[nodiscard]] PageSubject pageSubject(std::size_t number) const;
     [[nodiscard]] std::string httpAddress(const std::string& path) const;
     [[nodiscard]] std::string webAddress(std::size_t number) const;
     void printAddresses() const;
@@ -50,6 +52,7 @@ class Publisher {
     RtspServer m_server;
     HttpServer m_http; // listens where there are cameras
     std::unique_ptr<OnvifServer> m_onvif;
+    std::vector<std::unique_ptr<ControlPage>> m_pages; // of the cameras
     std::unique_ptr<Announcer> m_announcer;
 };
 
