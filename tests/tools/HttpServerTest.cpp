@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <future>
+#include <thread>
 
 namespace qivo::test {
 namespace {
@@ -157,49 +158,62 @@ TEST_F(HttpServing, aChunkedBodyWithoutEndIsCutOff) {
     EXPECT_TRUE(ended);
 }
 
-TEST_F(HttpServing, aSilentASlowAndAnIdleConnectionAreClosed) {
+TEST_F(HttpServing, aSilentAndASlowConnectionAreClosed) {
     const auto closed = serve([port = m_server.port()] {
         RawConnection silent(port);
         RawConnection slow(port);
-        RawConnection idle(port);
-        idle.send("GET /page HTTP/1.1\r\nHost: h\r\n\r\n");
-        EXPECT_EQ(statusOf(idle.readUntil("</p>")), 200);
         for (int i = 0; i < 15; ++i) {
             slow.send(i == 0 ? "G" : i == 1 ? "E" : "T");
             slow.readAll(50ms);
         }
         silent.readAll(2s);
-        idle.readAll(2s);
-        return std::vector<bool>{silent.ended(), slow.ended(), idle.ended()};
+        return std::vector<bool>{silent.ended(), slow.ended()};
     });
-    EXPECT_EQ(closed, (std::vector<bool>{true, true, true}));
+    EXPECT_EQ(closed, (std::vector<bool>{true, true}));
 }
 
-TEST_F(HttpServing, aConnectionServesManyRequests) {
-    const bool all = serve([port = m_server.port()] {
-        RawConnection client(port);
-        bool served = true;
-        for (int i = 0; i < 12; ++i) { // longer in all than one request may take
-            client.send("GET /page HTTP/1.1\r\nHost: h\r\n\r\n");
-            served = statusOf(client.readUntil("</p>")) == 200 && served;
-            client.readUntil("none", 50ms);
-        }
-        return served && !client.ended();
+TEST_F(HttpServing, aClientThatDoesNotTakeItsAnswerIsLeft) {
+    m_server.route("GET", "/much", [](const HttpRequest&, HttpReply reply) {
+        reply.send({200, "text/plain", std::string(64U << 20U, 'x'), {}});
     });
-    EXPECT_TRUE(all);
+    const std::size_t taken = serve([port = m_server.port()] {
+        RawConnection client(port);
+        client.send("GET /much HTTP/1.1\r\nHost: h\r\n\r\n");
+        std::this_thread::sleep_for(1200ms);
+        return client.readAll().size();
+    });
+    EXPECT_GT(taken, 0U);
+    EXPECT_LT(taken, 64U << 20U);
+}
+
+TEST_F(HttpServing, aConnectionServesOneRequest) {
+    const bool one = serve([port = m_server.port()] {
+        RawConnection client(port);
+        client.send("GET /page HTTP/1.1\r\nHost: h\r\n\r\nGET /page HTTP/1.1\r\nHost: h\r\n\r\n");
+        const std::string answer = client.readAll();
+        return answer.find("Connection: close\r\n") != std::string::npos &&
+               answer.find("HTTP/1.1", 1) == std::string::npos && client.ended();
+    });
+    EXPECT_TRUE(one);
 }
 
 TEST_F(HttpServing, connectionsOfOneAddressAreLimitedAndRoomReturnsWithTheirEnd) {
-    const auto [beyond, after] = serve([port = m_server.port()] {
+    HttpServer server; // patient: the many stay
+    server.route("GET", "/page", [](const HttpRequest&, HttpReply reply) { reply.send({200, "", "", {}}); });
+    ASSERT_EQ(server.listen(0, 0, true), "");
+    const std::string get = "GET /page HTTP/1.1\r\nHost: h\r\n\r\n";
+    const auto [beyond, after] = serve([port = server.port(), get] {
         std::vector<std::unique_ptr<RawConnection>> many;
         for (std::size_t i = 0; i < maximumHttpConnectionsOfOne; ++i) {
             many.push_back(std::make_unique<RawConnection>(port));
+            many.back()->send("GET ");
+            std::this_thread::sleep_for(2ms); // the kernel's queue is shorter than the limit
         }
-        const std::string refused = test::ask(port, "GET /page HTTP/1.1\r\nHost: h\r\n\r\n");
+        const std::string refused = test::ask(port, get);
         many.clear();
         std::string taken;
         for (int i = 0; i < 50 && taken.empty(); ++i) {
-            taken = test::ask(port, "GET /page HTTP/1.1\r\nHost: h\r\n\r\n");
+            taken = test::ask(port, get);
         }
         return std::pair(refused, taken);
     });
@@ -210,8 +224,7 @@ TEST_F(HttpServing, connectionsOfOneAddressAreLimitedAndRoomReturnsWithTheirEnd)
 TEST_F(HttpServing, whatIsNoHttpIsRefusedAndHarmsNobody) {
     for (const char* nonsense : {"\r\n\r\n", "GET\r\n\r\n", "GET /page\r\n\r\n", "\x16\x03\x01\x02\x00\r\n\r\n",
                                  "GET http://[ HTTP/1.1\r\n\r\n", "GET /page HTTP/9.9\r\n\r\n",
-                                 "POST /echo HTTP/1.1\r\nHost: h\r\nContent-Length: -1\r\n\r\n",
-                                 "POST /echo HTTP/1.1\r\nHost: h\r\nTransfer-Encoding: chunked\r\n\r\nzz\r\n\r\n"}) {
+                                 "POST /echo HTTP/1.1\r\nHost: h\r\nContent-Length: -1\r\n\r\n"}) {
         const std::string answer = serve([port = m_server.port(), nonsense] {
             RawConnection client(port);
             client.send(nonsense);
@@ -225,8 +238,8 @@ TEST_F(HttpServing, whatIsNoHttpIsRefusedAndHarmsNobody) {
 TEST_F(HttpServing, aBusyPortIsSaidOrPassedBy) {
     HttpServer second;
     const std::string problem = second.listen(m_server.port(), 0, true);
-    EXPECT_THAT(problem, testing::StartsWith("cannot serve web pages at port " + std::to_string(m_server.port())));
-    EXPECT_THAT(problem, HasSubstr("in use"));
+    EXPECT_THAT(problem, testing::StartsWith("cannot serve at HTTP port " + std::to_string(m_server.port())));
+    EXPECT_THAT(problem, HasSubstr("in use; choose another with --http-port"));
     EXPECT_EQ(second.port(), 0);
     EXPECT_EQ(second.listen(-1, m_server.port(), true), "");
     EXPECT_NE(second.port(), m_server.port());

@@ -20,14 +20,10 @@ int portOf(GSocketAddress* address) {
     return G_IS_INET_SOCKET_ADDRESS(address) ? g_inet_socket_address_get_port(G_INET_SOCKET_ADDRESS(address)) : 0;
 }
 
-std::string methodOf(SoupServerMessage* message) {
-    const std::string method = soup_server_message_get_method(message);
-    return method == "HEAD" ? "GET" : method;
-}
-
 HttpRequest requestOf(SoupServerMessage* message) {
     HttpRequest request;
-    request.method = methodOf(message);
+    request.sentMethod = soup_server_message_get_method(message);
+    request.method = request.sentMethod == "HEAD" ? "GET" : request.sentMethod;
     GUri* uri = soup_server_message_get_uri(message);
     request.path = g_uri_get_path(uri);
     request.query = g_uri_get_query(uri) != nullptr ? g_uri_get_query(uri) : "";
@@ -54,6 +50,7 @@ void write(SoupServerMessage* message, const HttpResponse& response) {
     SoupMessageHeaders* headers = soup_server_message_get_response_headers(message);
     soup_message_headers_replace(headers, "X-Content-Type-Options", "nosniff");
     soup_message_headers_replace(headers, "Cache-Control", "no-store");
+    soup_message_headers_replace(headers, "Connection", "close");
     for (const auto& [name, value] : response.headers) {
         if (g_ascii_strcasecmp(name.c_str(), "Cache-Control") == 0) {
             soup_message_headers_replace(headers, name.c_str(), value.c_str());
@@ -137,25 +134,20 @@ void HttpReply::send(const HttpResponse& response) {
 HttpServer::HttpServer(HttpPatience patience)
     : m_patience(patience),
       m_server(SOUP_SERVER(g_object_new(SOUP_TYPE_SERVER, "server-header", "qivo-publish", nullptr))) {
-    const auto started = +[](SoupServer*, SoupServerMessage* message, gpointer self) {
-        static_cast<HttpServer*>(self)->awaitRequest(message);
-    };
     const auto head = +[](SoupServer*, SoupServerMessage* message, const char*, GHashTable*, gpointer self) {
-        static_cast<HttpServer*>(self)->bound(message);
+        static_cast<HttpServer*>(self)->limit(message);
     };
     const auto whole = +[](SoupServer*, SoupServerMessage* message, const char*, GHashTable*, gpointer self) {
         static_cast<HttpServer*>(self)->answer(message);
     };
-    g_signal_connect(m_server.get(), "request-started", G_CALLBACK(started), this);
     soup_server_add_early_handler(m_server.get(), nullptr, head, this, nullptr);
     soup_server_add_handler(m_server.get(), nullptr, whole, this, nullptr);
 }
 
 HttpServer::~HttpServer() {
     stop();
-    g_signal_handlers_disconnect_by_data(m_server.get(), this);
-    for (auto& [socket, connection] : m_connections) {
-        g_object_weak_unref(G_OBJECT(socket), onGone, this);
+    for (auto& [stream, connection] : m_connections) {
+        g_object_weak_unref(G_OBJECT(stream), onGone, this);
         endTime(connection);
     }
 }
@@ -167,61 +159,84 @@ void HttpServer::route(const std::string& method, const std::string& path, HttpH
 bool HttpServer::bind(int port, bool loopbackOnly, std::string& reason) {
     const Object<GSocketAddress> wanted(
         g_inet_socket_address_new_from_string(loopbackOnly ? "127.0.0.1" : "0.0.0.0", static_cast<guint>(port)));
+    GSocketAddress* bound = nullptr;
     GError* failure = nullptr;
     const bool done =
-        soup_server_listen(m_server.get(), wanted.get(), static_cast<SoupServerListenOptions>(0), &failure) != FALSE;
+        g_socket_listener_add_address(G_SOCKET_LISTENER(m_listener.get()), wanted.get(), G_SOCKET_TYPE_STREAM,
+                                      G_SOCKET_PROTOCOL_TCP, nullptr, &bound, &failure) != FALSE;
     const Error error(failure);
+    const Object<GSocketAddress> address(bound);
     if (!done) {
         reason = error ? error->message : "unknown reason";
         return false;
     }
-    const std::unique_ptr<GSList, void (*)(GSList*)> listeners(soup_server_get_listeners(m_server.get()), g_slist_free);
-    const Object<GSocketAddress> bound(g_socket_get_local_address(static_cast<GSocket*>(listeners->data), nullptr));
-    m_port = portOf(bound.get());
+    m_port = portOf(address.get());
     return true;
 }
 
 std::string HttpServer::listen(int port, int preferred, bool loopbackOnly) {
+    m_listener.reset(g_socket_service_new());
+    const auto incoming = +[](GSocketService*, GSocketConnection* stream, GObject*, gpointer self) -> gboolean {
+        static_cast<HttpServer*>(self)->accept(stream);
+        return TRUE;
+    };
+    g_signal_connect(m_listener.get(), "incoming", G_CALLBACK(incoming), this);
     std::string reason;
     const bool anyWillDo = port < 0;
     if (bind(anyWillDo ? preferred : port, loopbackOnly, reason) || (anyWillDo && bind(0, loopbackOnly, reason))) {
         return {};
     }
-    return "cannot serve web pages at port " + std::to_string(port) + ": " + reason;
+    m_listener.reset();
+    return "cannot serve at HTTP port " + std::to_string(port) + ": " + reason +
+           "; choose another with --http-port, or --http-port 0 for any free one";
 }
 
 void HttpServer::stop() {
+    if (m_listener) {
+        g_signal_handlers_disconnect_by_data(m_listener.get(), this);
+        g_socket_service_stop(m_listener.get());
+        g_socket_listener_close(G_SOCKET_LISTENER(m_listener.get()));
+        m_listener.reset();
+    }
     soup_server_disconnect(m_server.get());
     m_port = 0;
 }
 
-// A connection's first request starts with the connection, before a byte of it has come.
-void HttpServer::awaitRequest(SoupServerMessage* message) {
-    GSocket* socket = soup_server_message_get_socket(message);
-    const std::string address = addressOf(soup_server_message_get_remote_address(message));
-    if (m_connections.count(socket) == 0) {
-        const auto ofOne = std::count_if(m_connections.begin(), m_connections.end(),
-                                         [&address](const auto& entry) { return entry.second.address == address; });
-        if (m_connections.size() >= maximumHttpConnections ||
-            static_cast<std::size_t>(ofOne) >= maximumHttpConnectionsOfOne) {
-            g_socket_shutdown(socket, TRUE, TRUE, nullptr);
-            return;
-        }
-        m_connections[socket].address = address;
-        g_object_weak_ref(G_OBJECT(socket), onGone, this);
+// Accepted here and not by libsoup, which neither counts connections nor, in versions that are about, lets go of those
+// that its own listeners brought.
+void HttpServer::accept(GSocketConnection* stream) {
+    const Object<GSocketAddress> remote(g_socket_connection_get_remote_address(stream, nullptr));
+    const Object<GSocketAddress> local(g_socket_connection_get_local_address(stream, nullptr));
+    const std::string address = addressOf(remote.get());
+    const auto ofOne = std::count_if(m_connections.begin(), m_connections.end(),
+                                     [&address](const auto& entry) { return entry.second.address == address; });
+    if (!remote || !local || m_connections.size() >= maximumHttpConnections ||
+        static_cast<std::size_t>(ofOne) >= maximumHttpConnectionsOfOne) {
+        g_io_stream_close(G_IO_STREAM(stream), nullptr, nullptr);
+        return;
     }
-    giveTime(message, m_patience.request);
+    g_object_weak_ref(G_OBJECT(stream), onGone, this);
+    auto& entry = *m_connections.emplace(stream, Connection{share(remote.get()), address, 0}).first;
+    giveTime(entry, m_patience.request);
+    soup_server_accept_iostream(m_server.get(), G_IO_STREAM(stream), local.get(), remote.get(), nullptr);
 }
 
-void HttpServer::onGone(gpointer server, GObject* socket) {
+void HttpServer::onGone(gpointer server, GObject* stream) {
     auto& connections = static_cast<HttpServer*>(server)->m_connections;
-    const auto found = std::find_if(connections.begin(), connections.end(), [socket](const auto& entry) {
-        return static_cast<const void*>(entry.first) == socket;
+    const auto found = std::find_if(connections.begin(), connections.end(), [stream](const auto& entry) {
+        return static_cast<const void*>(entry.first) == stream;
     });
     if (found != connections.end()) {
         endTime(found->second);
         connections.erase(found);
     }
+}
+
+HttpServer::Connections::value_type* HttpServer::connectionOf(SoupServerMessage* message) {
+    const GSocketAddress* remote = soup_server_message_get_remote_address(message);
+    const auto found = std::find_if(m_connections.begin(), m_connections.end(),
+                                    [remote](const auto& entry) { return entry.second.remote.get() == remote; });
+    return found == m_connections.end() ? nullptr : &*found;
 }
 
 void HttpServer::endTime(Connection& connection) {
@@ -231,24 +246,19 @@ void HttpServer::endTime(Connection& connection) {
     }
 }
 
-void HttpServer::giveTime(SoupServerMessage* message, std::chrono::milliseconds time) {
-    const auto found = m_connections.find(soup_server_message_get_socket(message));
-    if (found == m_connections.end()) {
-        return;
-    }
-    endTime(found->second);
-    using Entry = decltype(m_connections)::value_type;
+void HttpServer::giveTime(Connections::value_type& entry, std::chrono::milliseconds time) {
+    endTime(entry.second);
     const auto over = [](gpointer data) -> gboolean {
-        auto& [socket, connection] = *static_cast<Entry*>(data);
+        auto& [stream, connection] = *static_cast<Connections::value_type*>(data);
         connection.timer = 0;
         // libsoup reads the end of the stream and closes what is its own.
-        g_socket_shutdown(socket, TRUE, TRUE, nullptr);
+        g_socket_shutdown(g_socket_connection_get_socket(stream), TRUE, TRUE, nullptr);
         return G_SOURCE_REMOVE;
     };
-    found->second.timer = g_timeout_add(static_cast<guint>(time.count()), over, &*found);
+    entry.second.timer = g_timeout_add(static_cast<guint>(time.count()), over, &entry);
 }
 
-void HttpServer::bound(SoupServerMessage* message) {
+void HttpServer::limit(SoupServerMessage* message) {
     SoupMessageHeaders* headers = soup_server_message_get_request_headers(message);
     if (soup_message_headers_get_encoding(headers) == SOUP_ENCODING_CONTENT_LENGTH) {
         const goffset length = soup_message_headers_get_content_length(headers);
@@ -257,15 +267,15 @@ void HttpServer::bound(SoupServerMessage* message) {
         }
         return;
     }
-    const auto chunk = +[](SoupServerMessage* from, GBytes* bytes, gpointer) {
+    const auto chunk = +[](SoupServerMessage* from, GBytes* bytes, gpointer self) {
         const gsize before = GPOINTER_TO_SIZE(g_object_get_data(G_OBJECT(from), receivedKey));
         const gsize received = before + g_bytes_get_size(bytes);
         g_object_set_data(G_OBJECT(from), receivedKey, GSIZE_TO_POINTER(received));
         if (before <= maximumHttpRequestBytes && received > maximumHttpRequestBytes) {
-            refuseLength(from);
+            static_cast<HttpServer*>(self)->refuseLength(from);
         }
     };
-    g_signal_connect(message, "got-chunk", G_CALLBACK(chunk), nullptr);
+    g_signal_connect(message, "got-chunk", G_CALLBACK(chunk), this);
 }
 
 // libsoup answers only once it has read the whole body. So the answer goes past it, and what still comes is dropped
@@ -275,18 +285,21 @@ void HttpServer::refuseLength(SoupServerMessage* message) {
         "HTTP/1.1 413 Payload Too Large\r\nConnection: close\r\nContent-Length: 0\r\n\r\n";
     soup_message_body_set_accumulate(soup_server_message_get_request_body(message), FALSE);
     soup_server_message_set_status(message, SOUP_STATUS_REQUEST_ENTITY_TOO_LARGE, nullptr);
-    GSocket* socket = soup_server_message_get_socket(message);
-    g_socket_send(socket, refusal.data(), refusal.size(), nullptr, nullptr);
-    g_socket_shutdown(socket, FALSE, TRUE, nullptr);
+    if (const auto* entry = connectionOf(message)) {
+        GSocket* socket = g_socket_connection_get_socket(entry->first);
+        g_socket_send(socket, refusal.data(), refusal.size(), nullptr, nullptr);
+        g_socket_shutdown(socket, FALSE, TRUE, nullptr);
+    }
 }
 
 void HttpServer::answer(SoupServerMessage* message) {
-    if (const auto found = m_connections.find(soup_server_message_get_socket(message)); found != m_connections.end()) {
-        endTime(found->second);
+    if (auto* entry = connectionOf(message)) {
+        endTime(entry->second);
     }
     HttpReply reply(message, [weak = std::weak_ptr<HttpServer*>(m_self)](SoupServerMessage* sent) {
-        if (const auto self = weak.lock()) {
-            (*self)->giveTime(sent, (*self)->m_patience.response);
+        const auto self = weak.lock();
+        if (auto* entry = self ? (*self)->connectionOf(sent) : nullptr) {
+            (*self)->giveTime(*entry, (*self)->m_patience.response);
         }
     });
     const HttpRequest request = requestOf(message);

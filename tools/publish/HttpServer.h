@@ -24,13 +24,14 @@ inline constexpr std::size_t maximumHttpConnectionsOfOne = 32;
 
 /** What a client gets, and how long it may take for it, before its connection is closed. */
 struct HttpPatience {
-    std::chrono::milliseconds request{15000};  ///< a whole request, since the connection's begin or its last answer
+    std::chrono::milliseconds request{15000};  ///< a whole request, since the connection's begin
     std::chrono::milliseconds response{30000}; ///< the taking of a whole answer
 };
 
 /** A whole request, as a handler sees it. */
 struct HttpRequest {
-    std::string method; ///< "GET", "POST" and so on; a HEAD comes as "GET"
+    std::string method;     ///< "GET", "POST" and so on; a HEAD comes as "GET"
+    std::string sentMethod; ///< as it was sent
     std::string
         path; ///< as sent, normalised: no dot segments, nothing percent-encoded that need not be; begins with "/"
     std::string query; ///< without "?", as sent; empty if there is none
@@ -69,9 +70,9 @@ class HttpReply {
 
 using HttpHandler = std::function<void(const HttpRequest& request, HttpReply reply)>;
 
-/** An HTTP/1.1 server over IPv4 with exact paths: nothing is looked up in any file system. Every answer carries
- *  "X-Content-Type-Options: nosniff" and, unless it says otherwise, "Cache-Control: no-store". Lives on the thread of
- *  the default main context, where its handlers are called. */
+/** An HTTP/1.1 server over IPv4, with one request a connection and exact paths: nothing is looked up in any file
+ * system. Every answer carries "X-Content-Type-Options: nosniff" and, unless it says otherwise, "Cache-Control:
+ * no-store". Lives on the thread of the default main context, where its handlers are called. */
 class HttpServer {
   public:
     explicit HttpServer(HttpPatience patience = {});
@@ -95,25 +96,29 @@ class HttpServer {
 
   private:
     struct Connection {
+        Object<GSocketAddress> remote;
         std::string address;
-        guint timer = 0; // closes it
+        guint timer = 0; // ends it
     };
+    using Connections = std::map<GSocketConnection*, Connection>; // libsoup's; each leaves with its end
 
     [[nodiscard]] bool bind(int port, bool loopbackOnly, std::string& reason);
-    void awaitRequest(SoupServerMessage* message);
-    static void onGone(gpointer server, GObject* socket);
-    void giveTime(SoupServerMessage* message, std::chrono::milliseconds time);
+    void accept(GSocketConnection* stream);
+    static void onGone(gpointer server, GObject* stream);
+    [[nodiscard]] Connections::value_type* connectionOf(SoupServerMessage* message);
+    static void giveTime(Connections::value_type& entry, std::chrono::milliseconds time);
     static void endTime(Connection& connection);
-    static void bound(SoupServerMessage* message);
-    static void refuseLength(SoupServerMessage* message);
+    void limit(SoupServerMessage* message);
+    void refuseLength(SoupServerMessage* message);
     void answer(SoupServerMessage* message);
     [[nodiscard]] HttpResponse refusal(const std::string& path) const;
 
     HttpPatience m_patience;
     std::shared_ptr<HttpServer*> m_self = std::make_shared<HttpServer*>(this); // for replies that outlive the server
     std::map<std::string, std::map<std::string, HttpHandler>> m_routes;        // by path, then method
-    std::map<GSocket*, Connection> m_connections;                              // libsoup's; each leaves with its end
+    Connections m_connections;
     Object<SoupServer> m_server;
+    Object<GSocketService> m_listener;
     int m_port = 0;
 };
 

@@ -24,6 +24,8 @@ For the whole process:
   --loopback-only     serve and announce on this machine only
   --port N            serve at this port, 0 for any free one (default: 8554, or any free one if that is busy)
   --http-port N       steer cameras at this port, 0 for any free one (default: 8080, or any free one if that is busy)
+  --login USER:PASSWORD
+                      require this login for the streams and the steering (the announcements stay public)
   --help              print this text
   --version           print the version
 
@@ -106,6 +108,10 @@ Problem parsePort(const std::string& option, const std::string& text, int& port)
     port = *value;
     return {};
 }
+
+// Never with what was given: part of it is a password.
+const char* const loginProblem = "--login: not a login; write USER:PASSWORD, each of 1 to 64 bytes without control "
+                                 "characters, the user without \" and \\";
 
 Problem parseCodec(const std::string& text, Codec& codec) {
     if (text == "h264") {
@@ -257,9 +263,10 @@ class Reader {
 };
 
 bool takesValue(const std::string& option) {
-    static const std::set<std::string> options{
-        "--machine",  "--source",   "--input", "--size",      "--rate",       "--codec",          "--web",
-        "--low-size", "--low-rate", "--port",  "--http-port", "--audio-rate", "--audio-channels", "--audio-codec"};
+    static const std::set<std::string> options{"--machine",    "--source",         "--input",      "--size",
+                                               "--rate",       "--codec",          "--web",        "--low-size",
+                                               "--low-rate",   "--port",           "--http-port",  "--login",
+                                               "--audio-rate", "--audio-channels", "--audio-codec"};
     return options.count(option) != 0;
 }
 
@@ -308,6 +315,9 @@ Problem Reader::readValue(const std::string& option, const std::string& value) {
         return parsePort(option, value, m_options.port);
     } else if (option == "--http-port") {
         return parsePort(option, value, m_options.httpPort);
+    } else if (option == "--login") {
+        m_options.login = parseLogin(value);
+        return m_options.login ? Problem() : Problem(loginProblem);
     } else if (option == "--source") {
         return beginSource(value);
     } else if (option == "--input") {
