@@ -155,7 +155,8 @@ std::string Publisher::serveSteering() {
             cameras.push_back(onvifCamera(i));
         }
     }
-    m_onvif = std::make_unique<OnvifServer>(m_http, std::move(cameras));
+    m_httpLogin = m_options.login ? std::make_unique<HttpLogin>(*m_options.login) : nullptr;
+    m_onvif = std::make_unique<OnvifServer>(m_http, std::move(cameras), m_options.login, m_httpLogin.get());
     return m_http.listen(m_options.httpPort, preferredHttpPort, m_options.loopbackOnly);
 }
 

@@ -4,6 +4,7 @@
 #include "tools/publish/Camera.h"
 #include "tools/publish/HttpServer.h"
 #include "tools/publish/Input.h"
+#include "tools/publish/Login.h"
 #include "tools/publish/Options.h"
 #include "tools/publish/RtspServer.h"
 #include "tools/publish/onvif/OnvifServer.h"
@@ -47,7 +48,8 @@ class Publisher {
     std::vector<std::shared_ptr<Camera>> m_cameras; // of each source; null where there is none to steer
     std::string m_host;                             // at which this machine is reached
     RtspServer m_server;
-    HttpServer m_http; // listens where there are cameras
+    std::unique_ptr<HttpLogin> m_httpLogin; // null: nobody is asked
+    HttpServer m_http;                      // listens where there are cameras
     std::unique_ptr<OnvifServer> m_onvif;
     std::unique_ptr<Announcer> m_announcer;
 };

@@ -3,21 +3,41 @@
 namespace qivo {
 namespace {
 
-HttpResponse responseTo(const OnvifDevice& device, const HttpRequest& request) {
+constexpr const char* soapType = "application/soap+xml; charset=utf-8";
+
+// A browser names the page whose script asks; the services are for programs, not for the scripts of any page that
+// somebody on this network looks at.
+HttpResponse refusedToPages() {
+    return {403, soapType, soapFaultEnvelope({"Sender", {"NotAuthorized"}, "Pages are not answered."}), {}};
+}
+
+HttpResponse responseTo(const OnvifDevice& device, const HttpRequest& request, HttpLogin* login) {
+    if (!request.header("Origin").empty()) {
+        return refusedToPages();
+    }
+    const HttpLogin::Verdict verdict = login != nullptr ? login->check(request) : HttpLogin::Verdict::refused;
     const OnvifPlace place = placeOf(request.header("Host"), request.localAddress, request.localPort);
-    OnvifAnswer answer = device.answer(request.body, place, false);
-    return {answer.status, "application/soap+xml; charset=utf-8", std::move(answer.body), {}};
+    OnvifAnswer answer = device.answer(request.body, place, verdict == HttpLogin::Verdict::accepted);
+    HttpResponse response = login != nullptr && answer.challenge ? login->challenge(verdict) : HttpResponse{};
+    response.status = answer.status;
+    response.contentType = soapType;
+    response.body = std::move(answer.body);
+    return response;
 }
 
 } // namespace
 
-OnvifServer::OnvifServer(HttpServer& http, std::vector<OnvifCamera> cameras) : m_http(http) {
+OnvifServer::OnvifServer(HttpServer& http, std::vector<OnvifCamera> cameras, const std::optional<Login>& login,
+                         HttpLogin* httpLogin)
+    : m_http(http) {
+    const auto tokens = login ? std::make_shared<UsernameTokens>(*login) : nullptr;
     for (OnvifCamera& camera : cameras) {
-        const auto device = std::make_shared<OnvifDevice>(std::move(camera), nullptr);
+        const auto device = std::make_shared<OnvifDevice>(std::move(camera), tokens);
         for (const OnvifService& service : onvifServices()) {
-            http.route(
-                "POST", device->camera().path + std::string(service.name),
-                [device](const HttpRequest& request, HttpReply reply) { reply.send(responseTo(*device, request)); });
+            http.route("POST", device->camera().path + std::string(service.name),
+                       [device, httpLogin](const HttpRequest& request, HttpReply reply) {
+                           reply.send(responseTo(*device, request, httpLogin));
+                       });
         }
         m_devices.push_back(device);
     }

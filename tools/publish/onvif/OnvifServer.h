@@ -1,10 +1,12 @@
 #pragma once
 
 #include "tools/publish/HttpServer.h"
+#include "tools/publish/Login.h"
 #include "tools/publish/onvif/Onvif.h"
 #include "tools/publish/onvif/WsDiscovery.h"
 
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -14,8 +16,10 @@ namespace qivo {
  * main context, no longer than the HTTP server. */
 class OnvifServer {
   public:
-    /** Adds the services to `http`. */
-    OnvifServer(HttpServer& http, std::vector<OnvifCamera> cameras);
+    /** Adds the services to `http`. With a login, by HTTP digest (`httpLogin`, which must outlive this) or by
+     * WS-Security; null asks nobody. */
+    OnvifServer(HttpServer& http, std::vector<OnvifCamera> cameras, const std::optional<Login>& login,
+                HttpLogin* httpLogin);
     OnvifServer(const OnvifServer&) = delete;
     OnvifServer& operator=(const OnvifServer&) = delete;
 
