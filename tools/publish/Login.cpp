@@ -7,7 +7,6 @@
 namespace qivo {
 namespace {
 
-constexpr const char* realm = "qivo-publish";
 constexpr std::size_t secretBytes = 32;
 
 using Parameters = std::unique_ptr<GHashTable, void (*)(GHashTable*)>;
@@ -131,7 +130,7 @@ HttpLogin::Verdict HttpLogin::check(const HttpRequest& request) {
     const std::string nonce = parameter(said, "nonce");
     const std::string count = parameter(said, "nc");
     const std::string expected =
-        md5(md5(m_login.user + ":" + realm + ":" + m_login.password) + ":" + nonce + ":" + count + ":" +
+        md5(md5(m_login.user + ":" + loginRealm + ":" + m_login.password) + ":" + nonce + ":" + count + ":" +
             parameter(said, "cnonce") + ":auth:" + md5(request.sentMethod + ":" + uri));
     const bool right = equalInConstantTime(parameter(said, "response"), expected) &
                        equalInConstantTime(parameter(said, "username"), m_login.user) &
@@ -146,8 +145,9 @@ HttpLogin::Verdict HttpLogin::check(const HttpRequest& request) {
 }
 
 HttpResponse HttpLogin::challenge(Verdict verdict) const {
-    const std::string value = std::string("Digest realm=\"") + realm + "\", qop=\"auth\", algorithm=MD5, nonce=\"" +
-                              nonceOf(now()) + "\"" + (verdict == Verdict::stale ? ", stale=true" : "");
+    const std::string value = std::string("Digest realm=\"") + loginRealm +
+                              "\", qop=\"auth\", algorithm=MD5, nonce=\"" + nonceOf(now()) + "\"" +
+                              (verdict == Verdict::stale ? ", stale=true" : "");
     return {401, "text/plain; charset=utf-8", "A login is needed.\n", {{"WWW-Authenticate", value}}};
 }
 

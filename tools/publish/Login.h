@@ -14,6 +14,9 @@ namespace qivo {
 
 inline constexpr std::size_t maximumLoginBytes = 64;
 
+/** What clients are told that the login is for. */
+inline constexpr const char* loginRealm = "qivo-publish";
+
 /** Who may see and steer. */
 struct Login {
     std::string user;
@@ -39,6 +42,8 @@ class HttpLogin {
     static constexpr std::size_t maximumNonces = 256;
 
     explicit HttpLogin(Login login, Clock clock = std::chrono::steady_clock::now);
+
+    [[nodiscard]] const Login& login() const { return m_login; }
 
     enum class Verdict {
         accepted,

@@ -40,6 +40,20 @@ MakePictures inputPictures(const std::shared_ptr<Input>& input, Input::Branch br
     return [input, branch, look] { return Input::watch(input, branch, look); };
 }
 
+// A page shows what fits well on a screen beside its buttons.
+PictureSize pageSizeFor(PictureSize size) {
+    constexpr int widest = 960;
+    if (size.width <= widest) {
+        return size;
+    }
+    return {widest, std::max(minimumPictureHeight, size.height * widest / size.width & ~1)};
+}
+
+PictureRate pageRateFor(PictureRate rate) {
+    constexpr int enough = 15;
+    return rate.numerator <= enough * rate.denominator ? rate : PictureRate{enough, 1};
+}
+
 // What is heard in a source's streams: its tone, or its input's sound; nothing where there is none.
 std::optional<StreamSound> soundOf(const SourceOptions& source, std::size_t number, const InputPlace& place,
                                    const std::shared_ptr<Input>& input, Input::Branch branch) {
@@ -60,6 +74,9 @@ std::string missingElement(const std::vector<SourceOptions>& sources) {
         if (!source.input.empty()) {
             const auto more = elementsFor(placeOf(source.input).kind);
             elements.insert(elements.end(), more.begin(), more.end());
+        }
+        if (source.ptz) {
+            elements.push_back({"jpegenc", "gstreamer1.0-plugins-good"});
         }
         if (source.audio) {
             const auto more = elementsFor(source.audioCodec);
@@ -104,6 +121,10 @@ std::string Publisher::start() {
     }
     if (std::string problem = findInputs(); !problem.empty()) {
         return problem;
+    }
+    if (m_options.login) {
+        m_login = std::make_shared<HttpLogin>(*m_options.login);
+        m_server.requireLogin(*m_options.login);
     }
     makeCameras();
     mountSources();
@@ -153,10 +174,10 @@ std::string Publisher::serveSteering() {
     for (std::size_t i = 0; i < m_cameras.size(); ++i) {
         if (m_cameras[i]) {
             cameras.push_back(onvifCamera(i));
+            m_pages.push_back(std::make_unique<ControlPage>(m_http, pageSubject(i), m_login));
         }
     }
-    m_httpLogin = m_options.login ? std::make_unique<HttpLogin>(*m_options.login) : nullptr;
-    m_onvif = std::make_unique<OnvifServer>(m_http, std::move(cameras), m_options.login, m_httpLogin.get());
+    m_onvif = std::make_unique<OnvifServer>(m_http, std::move(cameras), m_login);
     return m_http.listen(m_options.httpPort, preferredHttpPort, m_options.loopbackOnly);
 }
 
@@ -172,6 +193,19 @@ OnvifCamera Publisher::onvifCamera(std::size_t number) const {
             {{"full", "Full", fullPath(number), full.size, full.rate, source.codec, bitRateFor(full)},
              {"low", "Low bandwidth", lowPath(number), low.size, low.rate, source.codec, bitRateFor(low)}},
             m_server.port()};
+}
+
+PageSubject Publisher::pageSubject(std::size_t number) const {
+    const SourceOptions& source = m_options.sources[number];
+    const PictureFormat format = formatOf(pageSizeFor(source.size), pageRateFor(source.rate), Codec::mjpeg);
+    return {webPath(number),
+            m_options.machine,
+            instanceName(m_options.machine, source.name),
+            std::to_string(source.size.width) + " × " + std::to_string(source.size.height),
+            m_cameras[number],
+            format,
+            picturesOf(number, format),
+            [this, number] { return m_server.viewers(fullPath(number)) + m_server.viewers(lowPath(number)); }};
 }
 
 void Publisher::mountSources() {
@@ -241,6 +275,7 @@ void Publisher::stop() {
     m_announcer.reset();
     m_onvif.reset();
     m_http.stop();
+    m_pages.clear();
     m_server.stop();
 }
 

@@ -4,10 +4,10 @@
 #include "tools/publish/Camera.h"
 #include "tools/publish/HttpServer.h"
 #include "tools/publish/Input.h"
-#include "tools/publish/Login.h"
 #include "tools/publish/Options.h"
 #include "tools/publish/RtspServer.h"
 #include "tools/publish/onvif/OnvifServer.h"
+#include "tools/publish/page/ControlPage.h"
 
 #include <memory>
 #include <string>
@@ -38,6 +38,7 @@ class Publisher {
     [[nodiscard]] MakePictures picturesOf(std::size_t number, const PictureFormat& format) const;
     [[nodiscard]] std::string serveSteering();
     [[nodiscard]] OnvifCamera onvifCamera(std::size_t number) const;
+    [[nodiscard]] PageSubject pageSubject(std::size_t number) const;
     [[nodiscard]] std::string httpAddress(const std::string& path) const;
     [[nodiscard]] std::string webAddress(std::size_t number) const;
     void printAddresses() const;
@@ -47,10 +48,11 @@ class Publisher {
     std::vector<InputPlace> m_places;               // of each source
     std::vector<std::shared_ptr<Camera>> m_cameras; // of each source; null where there is none to steer
     std::string m_host;                             // at which this machine is reached
+    std::shared_ptr<HttpLogin> m_login;             // null where none is needed
     RtspServer m_server;
-    std::unique_ptr<HttpLogin> m_httpLogin; // null: nobody is asked
-    HttpServer m_http;                      // listens where there are cameras
+    HttpServer m_http; // listens where there are cameras
     std::unique_ptr<OnvifServer> m_onvif;
+    std::vector<std::unique_ptr<ControlPage>> m_pages; // of the cameras
     std::unique_ptr<Announcer> m_announcer;
 };
 

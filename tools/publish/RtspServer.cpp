@@ -3,6 +3,8 @@
 namespace qivo {
 namespace {
 
+constexpr const char* viewerRole = "viewer";
+
 void onPlay(GstRTSPClient*, GstRTSPContext* context, gpointer) {
     if (context->media != nullptr) {
         requestKeyPicture(context->media);
@@ -23,9 +25,42 @@ RtspServer::~RtspServer() {
     stop();
 }
 
+void RtspServer::requireLogin(const Login& login) {
+    const Object<GstRTSPAuth> auth(gst_rtsp_auth_new());
+    gst_rtsp_auth_set_supported_methods(auth.get(), GST_RTSP_AUTH_DIGEST);
+    gst_rtsp_auth_set_realm(auth.get(), loginRealm);
+    GstRTSPToken* token = gst_rtsp_token_new(GST_RTSP_TOKEN_MEDIA_FACTORY_ROLE, G_TYPE_STRING, viewerRole, nullptr);
+    gst_rtsp_auth_add_digest(auth.get(), login.user.c_str(), login.password.c_str(), token);
+    gst_rtsp_token_unref(token);
+    gst_rtsp_server_set_auth(m_server.get(), auth.get());
+    m_loginNeeded = true;
+}
+
 void RtspServer::mount(const std::string& path, Object<GstRTSPMediaFactory> factory) {
+    if (m_loginNeeded) {
+        gst_rtsp_media_factory_add_role(factory.get(), viewerRole, GST_RTSP_PERM_MEDIA_FACTORY_ACCESS, G_TYPE_BOOLEAN,
+                                        TRUE, GST_RTSP_PERM_MEDIA_FACTORY_CONSTRUCT, G_TYPE_BOOLEAN, TRUE, nullptr);
+    }
     const Object<GstRTSPMountPoints> mounts(gst_rtsp_server_get_mount_points(m_server.get()));
     gst_rtsp_mount_points_add_factory(mounts.get(), path.c_str(), factory.release());
+}
+
+int RtspServer::viewers(const std::string& path) const {
+    struct Count {
+        const std::string& path;
+        int playing;
+    } count{path, 0};
+    const Object<GstRTSPSessionPool> sessions(gst_rtsp_server_get_session_pool(m_server.get()));
+    const auto look = [](GstRTSPSessionPool*, GstRTSPSession* session, gpointer data) {
+        auto* found = static_cast<Count*>(data);
+        gint matched = 0;
+        GstRTSPSessionMedia* media = gst_rtsp_session_get_media(session, found->path.c_str(), &matched);
+        const bool whole = media != nullptr && matched == static_cast<gint>(found->path.size());
+        found->playing += whole && gst_rtsp_session_media_get_rtsp_state(media) == GST_RTSP_STATE_PLAYING ? 1 : 0;
+        return GST_RTSP_FILTER_KEEP;
+    };
+    g_list_free_full(gst_rtsp_session_pool_filter(sessions.get(), look, &count), g_object_unref);
+    return count.playing;
 }
 
 bool RtspServer::attach(int port, std::string& reason) {

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "tools/publish/Handles.h"
+#include "tools/publish/Login.h"
 #include "tools/publish/Stream.h"
 
 #include <gst/rtsp-server/rtsp-server.h>
@@ -15,6 +16,13 @@ class RtspServer {
     ~RtspServer();
     RtspServer(const RtspServer&) = delete;
     RtspServer& operator=(const RtspServer&) = delete;
+
+    /** Lets only those who log in, by digest, see what is mounted from now on. */
+    void requireLogin(const Login& login);
+
+    /** Those who play the stream under a path at this moment. One who went without a word is among them until the
+     *  server's time-out, a minute at most. */
+    [[nodiscard]] int viewers(const std::string& path) const;
 
     /** Serves a stream under a path, which begins with "/". */
     void mount(const std::string& path, Object<GstRTSPMediaFactory> factory);
@@ -34,6 +42,7 @@ class RtspServer {
 
     Object<GstRTSPServer> m_server;
     guint m_source = 0;
+    bool m_loginNeeded = false;
 };
 
 } // namespace qivo

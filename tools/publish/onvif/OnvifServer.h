@@ -6,7 +6,6 @@
 #include "tools/publish/onvif/WsDiscovery.h"
 
 #include <memory>
-#include <optional>
 #include <string>
 #include <vector>
 
@@ -16,10 +15,8 @@ namespace qivo {
  * main context, no longer than the HTTP server. */
 class OnvifServer {
   public:
-    /** Adds the services to `http`. With a login, by HTTP digest (`httpLogin`, which must outlive this) or by
-     * WS-Security; null asks nobody. */
-    OnvifServer(HttpServer& http, std::vector<OnvifCamera> cameras, const std::optional<Login>& login,
-                HttpLogin* httpLogin);
+    /** Adds the services to `http`. With a login they want it as HTTP digest or as WS-Security token. */
+    OnvifServer(HttpServer& http, std::vector<OnvifCamera> cameras, const std::shared_ptr<HttpLogin>& login);
     OnvifServer(const OnvifServer&) = delete;
     OnvifServer& operator=(const OnvifServer&) = delete;
 
