@@ -43,6 +43,11 @@ std::string reasonOf(const OwnedError& error) {
     return error ? error->message : "no reason given";
 }
 
+std::string hostOf(const std::string& url) {
+    const auto parts = urlParts(url);
+    return parts ? parts->host : std::string();
+}
+
 bool isRedirection(unsigned status) {
     return status == SOUP_STATUS_MOVED_PERMANENTLY || status == SOUP_STATUS_FOUND ||
            status == SOUP_STATUS_TEMPORARY_REDIRECT || status == SOUP_STATUS_PERMANENT_REDIRECT;
@@ -92,8 +97,7 @@ struct SoapClient::Callbacks {
     static gboolean authenticate(SoupMessage*, SoupAuth* auth, gboolean retrying, gpointer data) {
         const Exchange& exchange = *static_cast<Exchange*>(data);
         const SteeringTarget& target = exchange.client->m_target;
-        const auto parts = urlParts(exchange.url);
-        if (retrying != FALSE || !target.login || !parts || !sameHost(parts->host, target.loginHost)) {
+        if (retrying != FALSE || !target.login || !sameHost(hostOf(exchange.url), target.loginHost)) {
             return FALSE;
         }
         soup_auth_authenticate(auth, target.login->user.c_str(), target.login->password.c_str());
@@ -101,6 +105,11 @@ struct SoapClient::Callbacks {
     }
 
     static gboolean acceptCertificate(SoupMessage*, GTlsCertificate*, GTlsCertificateFlags, gpointer) { return TRUE; }
+
+    static void restarted(SoupMessage*, gpointer data) {
+        const auto& exchange = *static_cast<Exchange*>(data);
+        exchange.client->fill(exchange);
+    }
 
     static void sent(GObject* session, GAsyncResult* result, gpointer data) {
         auto& exchange = *static_cast<Exchange*>(data);
@@ -180,22 +189,28 @@ void SoapClient::post(const std::string& url, const SoapMessage& message, std::c
 }
 
 void SoapClient::send(Exchange& exchange) {
-    const auto parts = urlParts(exchange.url);
-    exchange.message.reset(parts ? soup_message_new(SOUP_METHOD_POST, exchange.url.c_str()) : nullptr);
+    exchange.message.reset(urlParts(exchange.url) ? soup_message_new(SOUP_METHOD_POST, exchange.url.c_str()) : nullptr);
     if (!exchange.message || !m_target.admits(exchange.url)) {
         finish(exchange, "the address " + exchange.url + " is not on a host that may be asked");
         return;
     }
     SoupMessage* message = exchange.message.get();
-    const std::string text = envelope(exchange.soap, headerFor(parts->host, exchange.soap));
-    const std::unique_ptr<GBytes, FreeBytes> bytes(g_bytes_new(text.data(), text.size()));
-    const std::string type = "application/soap+xml; charset=utf-8; action=\"" + exchange.soap.action + "\"";
-    soup_message_set_request_body_from_bytes(message, type.c_str(), bytes.get());
+    fill(exchange);
     soup_message_add_flags(message, SOUP_MESSAGE_NO_REDIRECT);
     g_signal_connect(message, "authenticate", G_CALLBACK(Callbacks::authenticate), &exchange);
     g_signal_connect(message, "accept-certificate", G_CALLBACK(Callbacks::acceptCertificate), nullptr);
+    g_signal_connect(message, "restarted", G_CALLBACK(Callbacks::restarted), &exchange);
     soup_session_send_async(m_session.get(), message, G_PRIORITY_DEFAULT, exchange.cancel.get(), Callbacks::sent,
                             &exchange);
+}
+
+/// Gives the message its document. To be done anew when it is sent once more with a login: the library does not keep
+/// the document, and a nonce is used only once.
+void SoapClient::fill(const Exchange& exchange) const {
+    const std::string text = envelope(exchange.soap, headerFor(hostOf(exchange.url), exchange.soap));
+    const std::unique_ptr<GBytes, FreeBytes> bytes(g_bytes_new(text.data(), text.size()));
+    const std::string type = "application/soap+xml; charset=utf-8; action=\"" + exchange.soap.action + "\"";
+    soup_message_set_request_body_from_bytes(exchange.message.get(), type.c_str(), bytes.get());
 }
 
 /// Asks again at the place that the device points to, if it is on the same host.

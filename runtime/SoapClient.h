@@ -66,6 +66,7 @@ class SoapClient {
 
     std::string headerFor(const std::string& host, const SoapMessage& message) const;
     void send(Exchange& exchange);
+    void fill(const Exchange& exchange) const;
     void finish(Exchange& exchange, std::string failure);
     bool redirected(Exchange& exchange);
     static Answer answerOf(const Exchange& exchange);

@@ -3,4 +3,5 @@ add_library(qivo_scripted_camera STATIC RawServer.cpp RawServer.h ScriptedCamera
 target_link_libraries(qivo_scripted_camera PUBLIC qivo_runtime_steering GTest::gtest)
 
 qivo_test(test-steering-parts SOURCES SteeringPartsTest.cpp SteeringQueueTest.cpp LIBRARIES qivo_runtime_steering TSAN)
-qivo_test(test-steering SOURCES SteeringTest.cpp LIBRARIES qivo_scripted_camera NETWORK TSAN SERIAL)
+qivo_test(test-steering SOURCES SteeringTest.cpp SteeringQuirksTest.cpp LIBRARIES qivo_scripted_camera
+          PkgConfig::GSTREAMER NETWORK TSAN SERIAL)
