@@ -1,5 +1,6 @@
 #include "runtime/SoapClient.h"
 
+#include "runtime/GstHandles.h"
 #include "runtime/OnvifLogin.h"
 
 #include <algorithm>
@@ -22,9 +23,6 @@ struct FreeUri {
 struct FreeBytes {
     void operator()(GBytes* bytes) const { g_bytes_unref(bytes); }
 };
-struct FreeError {
-    void operator()(GError* error) const { g_error_free(error); }
-};
 struct FreeSource {
     void operator()(GSource* source) const {
         g_source_destroy(source);
@@ -37,7 +35,7 @@ struct FreeTime {
 
 template <typename T>
 using Owned = std::unique_ptr<T, Unref>;
-using OwnedError = std::unique_ptr<GError, FreeError>;
+using OwnedError = GstOwned<GError>;
 
 std::string reasonOf(const OwnedError& error) {
     return error ? error->message : "no reason given";
@@ -223,9 +221,9 @@ bool SoapClient::redirected(Exchange& exchange) {
     }
     const std::unique_ptr<GUri, FreeUri> uri(g_uri_parse_relative(
         soup_message_get_uri(message), location, static_cast<GUriFlags>(SOUP_HTTP_URI_FLAGS), nullptr));
-    const std::string address = uri ? g_uri_to_string(uri.get()) : "";
+    const GstOwned<gchar> address(uri ? g_uri_to_string(uri.get()) : nullptr);
     const auto from = urlParts(exchange.url);
-    const auto to = urlParts(address);
+    const auto to = address ? urlParts(address.get()) : std::nullopt;
     if (!from || !to || !sameHost(from->host, to->host)) {
         return false;
     }

@@ -65,7 +65,11 @@ std::string CameraCall::after(const std::string& text) const {
     return body.substr(begin, body.find_first_of("\"<", begin) - begin);
 }
 
-ScriptedCamera::ScriptedCamera(Quirk quirk, int port) : m_quirk(std::move(quirk)), m_server(port) {
+ScriptedCamera::ScriptedCamera(Quirk quirk, int port, const std::function<void(ScriptedCamera&)>& prepare)
+    : m_quirk(std::move(quirk)), m_server(port) {
+    if (prepare) {
+        prepare(*this);
+    }
     m_server.setScript([this](Connection& connection) { serve(connection); });
 }
 

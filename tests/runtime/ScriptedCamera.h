@@ -40,8 +40,9 @@ class ScriptedCamera {
         bool operator==(const Speed&) const = default;
     };
 
-    /// Everything is set before the first request. Port 0: any.
-    explicit ScriptedCamera(Quirk quirk = nullptr, int port = 0);
+    /// Port 0: any. What is public below is set by `prepare`, before the first request.
+    explicit ScriptedCamera(Quirk quirk = nullptr, int port = 0,
+                            const std::function<void(ScriptedCamera&)>& prepare = nullptr);
 
     std::string url(const std::string& path = "/onvif/device_service", const std::string& login = "") const;
     int port() const { return m_server.port(); }

@@ -304,10 +304,7 @@ class SteeringQuirks : public SteeringCameraTest, public testing::WithParamInter
 
 TEST_P(SteeringQuirks, AreSteeredOrRefused) {
     const Quirk& quirk = GetParam();
-    Camera camera(quirk.quirk);
-    if (quirk.prepare) {
-        quirk.prepare(camera);
-    }
+    Camera camera(quirk.quirk, 0, quirk.prepare);
     const auto steering = steer(camera, quirk.login);
     if (quirk.steered) {
         ASSERT_TRUE(found(*steering));

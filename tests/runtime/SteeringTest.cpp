@@ -26,6 +26,11 @@ ScriptedCamera::Quirk hangsOn(const std::string& operation) {
     };
 }
 
+/// A camera that takes no notice of the time after which it is to stop by itself.
+void movesOn(ScriptedCamera& camera) {
+    camera.ignoresRunOut = true;
+}
+
 TEST_F(SteeringCameraTest, CommandsReachTheCamera) {
     ScriptedCamera camera;
     const auto steering = steer(camera);
@@ -148,16 +153,17 @@ TEST_F(SteeringCameraTest, AStopDoesNotWaitForAnEarlierRequestThatHangs) {
 /// The camera reads the move first and does it last.
 TEST_F(SteeringCameraTest, AMoveThatTakesEffectAfterItsStopIsStoppedAgain) {
     auto late = std::make_shared<std::atomic<bool>>(false);
-    ScriptedCamera camera([late](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
-        if (call.operation != "ContinuousMove" || late->exchange(true)) {
-            return false;
-        }
-        self.until([&] { return self.count("Stop") == 1; });
-        std::this_thread::sleep_for(100ms);
-        connection.send(self.http(self.answerTo(call)));
-        return true;
-    });
-    camera.ignoresRunOut = true;
+    ScriptedCamera camera(
+        [late](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
+            if (call.operation != "ContinuousMove" || late->exchange(true)) {
+                return false;
+            }
+            self.until([&] { return self.count("Stop") == 1; });
+            std::this_thread::sleep_for(100ms);
+            connection.send(self.http(self.answerTo(call)));
+            return true;
+        },
+        0, movesOn);
     const auto steering = steer(camera);
     ASSERT_TRUE(found(*steering));
     EXPECT_TRUE(steering->zoom(1));
@@ -169,15 +175,16 @@ TEST_F(SteeringCameraTest, AMoveThatTakesEffectAfterItsStopIsStoppedAgain) {
 
 TEST_F(SteeringCameraTest, AStopThatIsLostIsAskedAgain) {
     auto lost = std::make_shared<std::atomic<int>>(0);
-    ScriptedCamera camera([lost](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
-        const bool stops = call.operation == "Stop" || call.after("PanTilt x=\"") == "0.0000";
-        if (!stops || ++*lost > 4) {
-            return false;
-        }
-        *lost % 2 == 0 ? connection.close() : static_cast<void>(connection.send(self.http(self.fault("busy"))));
-        return true;
-    });
-    camera.ignoresRunOut = true;
+    ScriptedCamera camera(
+        [lost](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
+            const bool stops = call.operation == "Stop" || call.after("PanTilt x=\"") == "0.0000";
+            if (!stops || ++*lost > 4) {
+                return false;
+            }
+            *lost % 2 == 0 ? connection.close() : static_cast<void>(connection.send(self.http(self.fault("busy"))));
+            return true;
+        },
+        0, movesOn);
     const auto steering = steer(camera);
     ASSERT_TRUE(found(*steering));
     EXPECT_TRUE(steering->panTilt(0.1F, 0));
@@ -189,8 +196,7 @@ TEST_F(SteeringCameraTest, AStopThatIsLostIsAskedAgain) {
 
 TEST_F(SteeringCameraTest, TheEndLeavesTheCameraStanding) {
     for (const bool ignoresRunOut : {false, true}) {
-        ScriptedCamera camera;
-        camera.ignoresRunOut = ignoresRunOut;
+        ScriptedCamera camera(nullptr, 0, ignoresRunOut ? movesOn : nullptr);
         auto steering = steer(camera);
         ASSERT_TRUE(found(*steering));
         EXPECT_TRUE(steering->panTilt(1, 1));
