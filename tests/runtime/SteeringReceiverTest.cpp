@@ -1,0 +1,172 @@
+// From the announcement to the camera: what an application sees of steering, and what the camera sees of its end.
+
+#include "tests/runtime/ReceiverFixture.h"
+#include "tests/runtime/SteeringFixture.h"
+#include "tests/support/Process.h"
+
+#include <gtest/gtest.h>
+
+#include <csignal>
+#include <string>
+
+namespace qivo::test {
+namespace {
+
+using runtime::Announcement;
+
+const std::string kPicture = "width=160,height=120,framerate=25/1";
+constexpr int kUsualPort = 80;
+
+class SteeringReceiverTest : public ReceiverFixture {
+  protected:
+    void announce(const std::string& onvif, const std::string& web = "") {
+        m_view->announce({Announcement{"STUDIO (Dome)", m_source.url(), "", web, onvif, false}});
+    }
+
+    /// Captures until the camera is found, as an application does. Counts the status changes on the way.
+    bool offersSteering(runtime::Receiver& receiver, std::chrono::milliseconds limit = 8s) {
+        const auto deadline = Clock::now() + limit;
+        while (Clock::now() < deadline) {
+            if (statusChanges(receiver, 100ms) && receiver.steering()) {
+                return true;
+            }
+        }
+        return false;
+    }
+
+    static std::string webControl(runtime::Receiver& receiver) {
+        const char* text = receiver.webControl();
+        const std::string address = text != nullptr ? text : "";
+        receiver.freeString(text);
+        return address;
+    }
+
+    RtspServer m_source{{.launch = h264(kPicture)}};
+};
+
+TEST_F(SteeringReceiverTest, TheFindingOfACameraIsAStatusChange) {
+    const ScriptedCamera camera;
+    const auto receiver = receive("", "STUDIO (Dome)");
+    announce(camera.url());
+    ASSERT_TRUE(offersSteering(*receiver));
+    EXPECT_TRUE(receiver->steering()->panTilt(0.5F, 0));
+    EXPECT_TRUE(camera.until([&] { return camera.speed().pan == -0.5F; }));
+    EXPECT_TRUE(nextPicture(*receiver));
+}
+
+TEST_F(SteeringReceiverTest, ACameraWithoutAControlPageGetsTheOneOfItsHost) {
+    const ScriptedCamera camera;
+    const auto receiver = receive("", "STUDIO (Dome)");
+    announce(camera.url("/onvif/device_service", "ann:secret"));
+    ASSERT_TRUE(offersSteering(*receiver));
+    EXPECT_EQ(webControl(*receiver), camera.url("/")) << "applications ask for steering only where there is one";
+    announce(camera.url("/onvif/device_service", "ann:secret"), "http://127.0.0.1/page");
+    ASSERT_TRUE(statusChanges(*receiver));
+    EXPECT_EQ(webControl(*receiver), "http://127.0.0.1/page");
+    EXPECT_TRUE(receiver->steering()) << "the camera is still the same";
+}
+
+TEST_F(SteeringReceiverTest, AnAnnouncementMayNameAnotherHost) {
+    const ScriptedCamera camera;
+    const auto receiver = receive("", "STUDIO (Dome)");
+    announce("http://localhost:" + std::to_string(camera.port()) + "/onvif/device_service");
+    EXPECT_TRUE(offersSteering(*receiver));
+}
+
+TEST_F(SteeringReceiverTest, ASourceThatAnnouncesNothingIsAskedAtTheUsualPlace) {
+    const ScriptedCamera camera(nullptr, kUsualPort);
+    const auto receiver = receive(m_source.url());
+    ASSERT_TRUE(offersSteering(*receiver));
+    EXPECT_EQ(camera.calls("GetCapabilities")[0].path, "/onvif/device_service");
+}
+
+TEST_F(SteeringReceiverTest, AnotherCameraOnTheSourcesHostIsNotTaken) {
+    ScriptedCamera camera(nullptr, kUsualPort);
+    camera.streamPath = "/other";
+    const auto receiver = receive(m_source.url());
+    ASSERT_TRUE(nextPicture(*receiver));
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetStreamUri") == 2; }));
+    EXPECT_FALSE(offersSteering(*receiver, 300ms));
+    EXPECT_EQ(webControl(*receiver), "");
+}
+
+TEST_F(SteeringReceiverTest, AnAnnouncementThatLeadsElsewhereStopsTheCameraThatWas) {
+    ScriptedCamera first;
+    first.ignoresRunOut = true;
+    const ScriptedCamera second;
+    const auto receiver = receive("", "STUDIO (Dome)");
+    announce(first.url());
+    ASSERT_TRUE(offersSteering(*receiver));
+    EXPECT_TRUE(receiver->steering()->zoom(0.5F));
+    ASSERT_TRUE(first.until([&] { return first.moves(); }));
+    announce(second.url());
+    ASSERT_TRUE(first.until([&] { return !first.moves(); }));
+    ASSERT_TRUE(first.until([&] { return receiver->steering() != nullptr; }));
+    EXPECT_TRUE(receiver->steering()->zoom(-0.5F));
+    EXPECT_TRUE(second.until([&] { return second.moves(); }));
+    EXPECT_FALSE(first.moves());
+}
+
+TEST_F(SteeringReceiverTest, SoundAloneIsNotSteered) {
+    const ScriptedCamera camera;
+    const auto receiver = receive("", "STUDIO (Dome)", QIVOlib_recv_bandwidth_audio_only);
+    announce(camera.url());
+    EXPECT_FALSE(offersSteering(*receiver, 300ms));
+    EXPECT_TRUE(camera.calls().empty());
+}
+
+TEST_F(SteeringReceiverTest, ADeadDeviceServiceDisturbsNeitherThePictureNorTheEnd) {
+    const RawServer dead;
+    auto receiver = receive("", "STUDIO (Dome)");
+    announce("http://127.0.0.1:" + std::to_string(dead.port()) + "/onvif/device_service");
+    ASSERT_TRUE(nextPicture(*receiver));
+    ASSERT_TRUE(ScriptedCamera::until([&] { return dead.connections() > 0; }));
+    EXPECT_TRUE(nextPicture(*receiver, 1s * kSanitizerPatience));
+    EXPECT_EQ(receiver->steering(), nullptr);
+    EXPECT_LT(costOf([&] { receiver.reset(); }), 20ms * kSanitizerPatience);
+}
+
+/// How the process of an application ends while its camera turns.
+struct End {
+    std::string name;
+    int signal = 0;              ///< that ends it
+    std::string itself = "hold"; ///< or what it does by itself
+    bool ignoresRunOut = false;  ///< whether a camera stands that does not stop by itself
+};
+
+std::ostream& operator<<(std::ostream& out, const End& end) {
+    return out << end.name;
+}
+
+class SteeringEnds : public testing::TestWithParam<End> {};
+
+TEST_P(SteeringEnds, LeaveTheCameraStanding) {
+    const End& end = GetParam();
+    ScriptedCamera camera(nullptr, kUsualPort);
+    camera.ignoresRunOut = end.ignoresRunOut;
+    const RtspServer source{{.launch = h264(kPicture)}};
+    const auto child = Process::start({STEER_CHILD, source.url(), end.itself});
+    ASSERT_TRUE(child);
+    ASSERT_TRUE(child->waitForOutput("turning")) << child->output() << child->errors();
+    ASSERT_TRUE(camera.until([&] { return camera.moves(); }));
+    if (end.signal == 0) {
+        ASSERT_TRUE(child->waitForOutput("ending"));
+    } else {
+        child->signal(end.signal);
+    }
+    const auto ended = Clock::now();
+    ASSERT_TRUE(camera.until([&] { return !camera.moves(); }, 3s * kSanitizerPatience));
+    EXPECT_LT(Clock::now() - ended, 1s + 50ms * kSanitizerPatience);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Process, SteeringEnds,
+    testing::Values(End{.name = "DestroyingTheReceiver", .itself = "receiver", .ignoresRunOut = true},
+                    End{.name = "DestroyingTheLibrary", .itself = "library", .ignoresRunOut = true},
+                    End{.name = "Exiting", .itself = "exit", .ignoresRunOut = true},
+                    End{.name = "Terminated", .signal = SIGTERM}, End{.name = "Interrupted", .signal = SIGINT},
+                    End{.name = "Killed", .signal = SIGKILL}, End{.name = "Crashed", .signal = SIGSEGV}),
+    [](const auto& one) { return one.param.name; });
+
+} // namespace
+} // namespace qivo::test
