@@ -6,7 +6,7 @@ packages_to_build=(
     g++ cmake ninja-build pkg-config
     qt6-base-dev libgl-dev libegl-dev libepoxy-dev
     libgstreamer1.0-dev libgstreamer-plugins-base1.0-dev libgstrtspserver-1.0-dev
-    libavahi-core-dev libglib2.0-dev libpango1.0-dev libpulse-dev libsdl2-dev
+    libavahi-core-dev libglib2.0-dev libpango1.0-dev libsoup-3.0-dev libpulse-dev libsdl2-dev
     libgtest-dev libgmock-dev libbenchmark-dev libx11-dev libxtst-dev libxcb1-dev
 )
 packages_to_run=(
@@ -19,7 +19,7 @@ packages_for_screen=(xvfb openbox x11-utils util-linux iproute2)
 # The suppressions of leaks name functions, which only llvm's symbolizer can tell.
 packages_to_test=(clang libclang-rt-14-dev llvm libegl1 libgl1 x11-xserver-utils dbus-daemon binutils pulseaudio
     pulseaudio-utils)
-packages_of_peers=(avahi-daemon avahi-utils dbus ffmpeg mpv picom)
+packages_of_peers=(avahi-daemon avahi-utils dbus ffmpeg mpv picom chromium chromium-driver)
 packages_to_lint=(clang-format clang-tidy git)
 
 # install_packages NAME...: installs those that are missing, as root or with sudo.

@@ -12,7 +12,7 @@ Options accepted(const Arguments& arguments) {
     const auto* options = std::get_if<Options>(&parsed);
     EXPECT_NE(options, nullptr) << (std::holds_alternative<UsageError>(parsed) ? std::get<UsageError>(parsed).text
                                                                                : "");
-    return options != nullptr ? *options : Options{"", 0, false, {SourceOptions{}}};
+    return options != nullptr ? *options : Options{.machine = "", .sources = {SourceOptions{}}};
 }
 
 std::string refused(const Arguments& arguments) {

@@ -1,5 +1,6 @@
 #include "tools/publish/Announcer.h"
 
+#include "tools/publish/LocalAddresses.h"
 #include "tools/publish/Names.h"
 
 #include <algorithm>
@@ -13,11 +14,8 @@
 #include <avahi-core/core.h>
 #include <avahi-core/log.h>
 #include <avahi-core/publish.h>
-#include <ifaddrs.h>
 #include <linux/netlink.h>
 #include <linux/rtnetlink.h>
-#include <net/if.h>
-#include <netinet/in.h>
 #include <optional>
 #include <sys/socket.h>
 #include <unistd.h>
@@ -75,36 +73,6 @@ std::string hostLabel(std::uint16_t port) {
     return std::string(cutUtf8(label.empty() ? "qivo" : label, AVAHI_LABEL_MAX - 1 - end.size())) + end;
 }
 
-struct LocalAddress {
-    AvahiIfIndex interface = AVAHI_IF_UNSPEC;
-    AvahiAddress address{};
-
-    friend bool operator==(const LocalAddress& a, const LocalAddress& b) {
-        return a.interface == b.interface && avahi_address_cmp(&a.address, &b.address) == 0;
-    }
-};
-
-// The IPv4 addresses of this machine, each with its interface.
-std::vector<LocalAddress> localAddresses(bool loopbackOnly) {
-    std::vector<LocalAddress> addresses;
-    ifaddrs* list = nullptr;
-    if (getifaddrs(&list) != 0) {
-        return addresses;
-    }
-    const std::unique_ptr<ifaddrs, void (*)(ifaddrs*)> owned(list, freeifaddrs);
-    for (const ifaddrs* entry = list; entry != nullptr; entry = entry->ifa_next) {
-        const bool loopback = (entry->ifa_flags & IFF_LOOPBACK) != 0;
-        if (entry->ifa_addr == nullptr || entry->ifa_addr->sa_family != AF_INET || (loopbackOnly && !loopback)) {
-            continue;
-        }
-        LocalAddress found{static_cast<AvahiIfIndex>(if_nametoindex(entry->ifa_name)), {}};
-        found.address.proto = AVAHI_PROTO_INET;
-        found.address.data.ipv4.address = reinterpret_cast<const sockaddr_in*>(entry->ifa_addr)->sin_addr.s_addr;
-        addresses.push_back(found);
-    }
-    return addresses;
-}
-
 // A descriptor that becomes readable when an interface or one of its addresses comes or goes; -1 if the system has
 // none.
 int openAddressNews() {
@@ -122,8 +90,10 @@ int openAddressNews() {
 Strings textRecords(const Announcement& announcement) {
     Strings strings(avahi_string_list_add_pair(nullptr, "path", announcement.path.c_str()));
     strings.reset(avahi_string_list_add_pair(strings.release(), "low", announcement.low.c_str()));
-    if (!announcement.web.empty()) {
-        strings.reset(avahi_string_list_add_pair(strings.release(), "web", announcement.web.c_str()));
+    for (const auto& [key, value] : {std::pair{"web", &announcement.web}, std::pair{"onvif", &announcement.onvif}}) {
+        if (!value->empty()) {
+            strings.reset(avahi_string_list_add_pair(strings.release(), key, value->c_str()));
+        }
     }
     return strings;
 }
@@ -279,9 +249,12 @@ void Announcer::Implementation::announceHost(AvahiServer* server) {
     }
     avahi_s_entry_group_reset(m_hostGroup);
     m_addresses = localAddresses(m_loopbackOnly);
-    for (LocalAddress& local : m_addresses) {
+    for (const LocalAddress& local : m_addresses) {
+        AvahiAddress address{};
+        address.proto = AVAHI_PROTO_INET;
+        address.data.ipv4.address = local.address.s_addr;
         avahi_server_add_address(server, m_hostGroup, local.interface, AVAHI_PROTO_INET, AVAHI_PUBLISH_NO_REVERSE,
-                                 nullptr, &local.address);
+                                 nullptr, &address);
     }
     avahi_s_entry_group_commit(m_hostGroup);
 }

@@ -12,9 +12,10 @@ namespace qivo {
 struct Announcement {
     std::string machine;
     std::string source;
-    std::string path; ///< of the full stream, begins with "/"
-    std::string low;  ///< of the low-bandwidth stream
-    std::string web;  ///< empty: none
+    std::string path;  ///< of the full stream, begins with "/"
+    std::string low;   ///< of the low-bandwidth stream
+    std::string web;   ///< empty: none
+    std::string onvif; ///< address of the device service; empty: none
 };
 
 /** Announces sources by multicast DNS as `_rtsp._tcp`, with a stack of its own that needs no daemon. It has a thread of

@@ -187,7 +187,7 @@ class InputPictureSource final : public PictureSource {
         }
         lock.unlock();
         if (!m_substitute) {
-            m_substitute = std::make_unique<TestPicturePainter>(m_slot.format, m_look);
+            m_substitute = std::make_unique<PicturePainter>(m_slot.format, drawTestPicture(m_slot.format, m_look));
         }
         return {m_substitute->paint(), due};
     }
@@ -207,8 +207,8 @@ class InputPictureSource final : public PictureSource {
     TestPictureLook m_look;
     Pacer m_pacer;
     Clock::time_point m_patientUntil;
-    std::unique_ptr<TestPicturePainter> m_substitute; // while there is no picture
-    bool m_stopped = false;                           // under the input's m_mutex
+    std::unique_ptr<PicturePainter> m_substitute; // while there is no picture
+    bool m_stopped = false;                       // under the input's m_mutex
 };
 
 /** The sound of a branch, a little late so that it does not stutter: a decoder brings more at a time than is asked for.

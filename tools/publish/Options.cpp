@@ -23,6 +23,7 @@ For the whole process:
   --machine NAME      the machine's name (default: the host's name)
   --loopback-only     serve and announce on this machine only
   --port N            serve at this port, 0 for any free one (default: 8554, or any free one if that is busy)
+  --http-port N       steer cameras at this port, 0 for any free one (default: 8080, or any free one if that is busy)
   --help              print this text
   --version           print the version
 
@@ -30,6 +31,7 @@ For a source. Given after a --source they belong to it; given before the first t
   --source NAME       begin a source of this name (default: one source, "Test Picture")
   --input WHAT        instead of the test picture: a media file, played in a loop; a capture device (/dev/videoN);
                       or an rtsp:// address, reconnected for as long as it takes
+  --ptz               instead of the test picture: a camera to steer, over ONVIF and from a web page of its own
   --size WxH          size of the picture (default: 1280x720); both numbers even
   --rate N[/D]        pictures a second (default: 30), for instance 25 or 30000/1001
   --codec NAME        h264, h265 or mjpeg (default: h264)
@@ -96,10 +98,10 @@ Problem parseRate(const std::string& option, const std::string& text, PictureRat
     return {};
 }
 
-Problem parsePort(const std::string& text, int& port) {
+Problem parsePort(const std::string& option, const std::string& text, int& port) {
     const auto value = wholeNumber(text);
     if (!value || *value > 65535) {
-        return "--port \"" + text + "\": not a port; write a number from 0 (any free one) to 65535";
+        return option + " \"" + text + "\": not a port; write a number from 0 (any free one) to 65535";
     }
     port = *value;
     return {};
@@ -218,6 +220,12 @@ Problem sourceProblem(const std::string& machine, const SourceOptions& source) {
     if (Problem problem = sourceNameProblem(machine, source.name); !problem.empty()) {
         return problem;
     }
+    if (source.ptz && !source.input.empty()) {
+        return "source \"" + source.name + "\": --ptz and --input both say what is shown; leave out one";
+    }
+    if (source.ptz && source.codec == Codec::h265) {
+        return "source \"" + source.name + "\": ONVIF names no H.265; steer a camera with --codec h264 or mjpeg";
+    }
     const int largest = std::max({source.size.width, source.size.height, source.lowSize.width, source.lowSize.height});
     if (source.codec == Codec::mjpeg && largest > maximumJpegSize) {
         return "source \"" + source.name + "\": --codec mjpeg carries at most " + std::to_string(maximumJpegSize) +
@@ -250,8 +258,8 @@ class Reader {
 
 bool takesValue(const std::string& option) {
     static const std::set<std::string> options{
-        "--machine",  "--source",   "--input", "--size",       "--rate",           "--codec",      "--web",
-        "--low-size", "--low-rate", "--port",  "--audio-rate", "--audio-channels", "--audio-codec"};
+        "--machine",  "--source",   "--input", "--size",      "--rate",       "--codec",          "--web",
+        "--low-size", "--low-rate", "--port",  "--http-port", "--audio-rate", "--audio-channels", "--audio-codec"};
     return options.count(option) != 0;
 }
 
@@ -271,6 +279,8 @@ ParsedOptions Reader::read(const std::vector<std::string>& arguments) {
             m_options.loopbackOnly = true;
         } else if (argument == "--no-audio") {
             current().source.audio = false;
+        } else if (argument == "--ptz") {
+            current().source.ptz = true;
         } else if (!takesValue(option)) {
             problem = "unknown option \"" + argument + "\"; --help lists what there is";
         } else if (equals != std::string::npos) {
@@ -295,7 +305,9 @@ Problem Reader::readValue(const std::string& option, const std::string& value) {
     if (option == "--machine") {
         m_options.machine = value;
     } else if (option == "--port") {
-        return parsePort(value, m_options.port);
+        return parsePort(option, value, m_options.port);
+    } else if (option == "--http-port") {
+        return parsePort(option, value, m_options.httpPort);
     } else if (option == "--source") {
         return beginSource(value);
     } else if (option == "--input") {

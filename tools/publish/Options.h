@@ -12,6 +12,7 @@ inline constexpr int maximumPictureSize = 4096;
 inline constexpr int maximumRate = 240;
 inline constexpr int maximumRateDenominator = 1001;
 inline constexpr int preferredPort = 8554;
+inline constexpr int preferredHttpPort = 8080;
 inline constexpr std::size_t maximumSources = 256;
 
 /** A TXT record's string holds 255 bytes, of which "web=" takes four. */
@@ -47,7 +48,8 @@ enum class SoundCodec { l16, l24, aac, opus, pcmu };
 struct SourceOptions {
     std::string name = "Test Picture";
     std::string input; ///< a file, a capture device or an rtsp address; empty for the test picture
-    std::string web;   ///< address of the control page; empty if there is none
+    bool ptz = false;  ///< a camera to steer in place of the test picture
+    std::string web;   ///< address of the control page; empty: the camera's own, or none
     PictureSize size;
     PictureRate rate;
     PictureSize lowSize; ///< of the low-bandwidth stream
@@ -62,7 +64,8 @@ struct SourceOptions {
 /** What the command line asks for. */
 struct Options {
     std::string machine;
-    int port = -1; ///< 0 for any free one, -1 for preferredPort or, where that is busy, any free one
+    int port = -1;     ///< 0 for any free one, -1 for preferredPort or, where that is busy, any free one
+    int httpPort = -1; ///< for steering; the same with preferredHttpPort
     bool loopbackOnly = false;
     std::vector<SourceOptions> sources; ///< at least one
 };

@@ -22,8 +22,16 @@ Caps PictureFormat::caps() const {
                                     nullptr));
 }
 
-TestPicturePainter::TestPicturePainter(const PictureFormat& format, const TestPictureLook& look)
-    : m_picture(format.size, look), m_pool(gst_buffer_pool_new()) {
+DrawPicture drawTestPicture(const PictureFormat& format, TestPictureLook look) {
+    look.space = format.space;
+    const auto picture = std::make_shared<TestPicture>(format.size, look);
+    return [picture](const PicturePlanes& planes, std::chrono::system_clock::time_point time) {
+        picture->draw(planes, time);
+    };
+}
+
+PicturePainter::PicturePainter(const PictureFormat& format, DrawPicture draw)
+    : m_draw(std::move(draw)), m_pool(gst_buffer_pool_new()) {
     const Caps caps = format.caps();
     gst_video_info_from_caps(&m_info, caps.get());
     GstStructure* config = gst_buffer_pool_get_config(m_pool.get());
@@ -32,11 +40,11 @@ TestPicturePainter::TestPicturePainter(const PictureFormat& format, const TestPi
     gst_buffer_pool_set_active(m_pool.get(), TRUE);
 }
 
-TestPicturePainter::~TestPicturePainter() {
+PicturePainter::~PicturePainter() {
     gst_buffer_pool_set_active(m_pool.get(), FALSE);
 }
 
-Buffer TestPicturePainter::paint() {
+Buffer PicturePainter::paint() {
     GstBuffer* buffer = nullptr;
     if (gst_buffer_pool_acquire_buffer(m_pool.get(), &buffer, nullptr) != GST_FLOW_OK) {
         return nullptr;
@@ -46,15 +54,15 @@ Buffer TestPicturePainter::paint() {
     if (gst_video_frame_map(&frame, &m_info, buffer, GST_MAP_WRITE) == FALSE) {
         return nullptr;
     }
-    m_picture.draw(planesOf(frame), std::chrono::system_clock::now());
+    m_draw(planesOf(frame), std::chrono::system_clock::now());
     gst_video_frame_unmap(&frame);
     return owned;
 }
 
-TestPictureSource::TestPictureSource(const PictureFormat& format, const TestPictureLook& look)
-    : m_painter(format, look), m_pacer(format.rate, std::chrono::steady_clock::now()) {}
+DrawnPictureSource::DrawnPictureSource(const PictureFormat& format, DrawPicture draw)
+    : m_painter(format, std::move(draw)), m_pacer(format.rate, std::chrono::steady_clock::now()) {}
 
-Picture TestPictureSource::next() {
+Picture DrawnPictureSource::next() {
     const auto due = m_pacer.next(std::chrono::steady_clock::now());
     {
         std::unique_lock lock(m_mutex);
@@ -65,7 +73,7 @@ Picture TestPictureSource::next() {
     return {m_painter.paint(), due};
 }
 
-void TestPictureSource::stop() {
+void DrawnPictureSource::stop() {
     {
         const std::lock_guard lock(m_mutex);
         m_stopped = true;

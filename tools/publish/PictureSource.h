@@ -7,6 +7,7 @@
 
 #include <chrono>
 #include <condition_variable>
+#include <functional>
 #include <gst/video/video.h>
 #include <memory>
 #include <mutex>
@@ -41,33 +42,39 @@ struct PictureFormat {
     [[nodiscard]] Caps caps() const;
 };
 
-/** Draws test pictures into buffers of a pool. */
-class TestPicturePainter {
+/** Fills planes with the picture of a moment. */
+using DrawPicture = std::function<void(const PicturePlanes&, std::chrono::system_clock::time_point)>;
+
+/** Draws test pictures of a format. */
+[[nodiscard]] DrawPicture drawTestPicture(const PictureFormat& format, TestPictureLook look);
+
+/** Draws pictures into buffers of a pool. */
+class PicturePainter {
   public:
-    TestPicturePainter(const PictureFormat& format, const TestPictureLook& look);
-    ~TestPicturePainter();
-    TestPicturePainter(const TestPicturePainter&) = delete;
-    TestPicturePainter& operator=(const TestPicturePainter&) = delete;
+    PicturePainter(const PictureFormat& format, DrawPicture draw);
+    ~PicturePainter();
+    PicturePainter(const PicturePainter&) = delete;
+    PicturePainter& operator=(const PicturePainter&) = delete;
 
     /** The picture of this moment; null if there is no memory. */
     [[nodiscard]] Buffer paint();
 
   private:
-    TestPicture m_picture;
+    DrawPicture m_draw;
     GstVideoInfo m_info{};
     Object<GstBufferPool> m_pool;
 };
 
-/** The live test picture at the format's rate. */
-class TestPictureSource final : public PictureSource {
+/** Drawn pictures, live at the format's rate. */
+class DrawnPictureSource final : public PictureSource {
   public:
-    TestPictureSource(const PictureFormat& format, const TestPictureLook& look);
+    DrawnPictureSource(const PictureFormat& format, DrawPicture draw);
 
     Picture next() override;
     void stop() override;
 
   private:
-    TestPicturePainter m_painter;
+    PicturePainter m_painter;
     Pacer m_pacer;
     std::mutex m_mutex;
     std::condition_variable m_changed;

@@ -1,8 +1,11 @@
 #include "tools/publish/Publisher.h"
 
+#include "tools/publish/CameraPicture.h"
 #include "tools/publish/Input.h"
+#include "tools/publish/LocalAddresses.h"
 #include "tools/publish/Names.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <set>
 
@@ -18,9 +21,19 @@ PictureFormat formatOf(PictureSize size, PictureRate rate, Codec codec) {
 }
 
 // Where each source's pictures come from: the test picture where there is no input.
-MakePictures testPictures(const PictureFormat& format, TestPictureLook look) {
-    look.space = format.space;
-    return [format, look] { return std::make_unique<TestPictureSource>(format, look); };
+MakePictures testPictures(const PictureFormat& format, const TestPictureLook& look) {
+    return [format, look] { return std::make_unique<DrawnPictureSource>(format, drawTestPicture(format, look)); };
+}
+
+MakePictures cameraPictures(const PictureFormat& format, const CameraPicture::Look& look,
+                            const std::shared_ptr<const Camera>& camera) {
+    return [format, look, camera] {
+        const auto picture = std::make_shared<CameraPicture>(format.size, format.space, look, camera);
+        return std::make_unique<DrawnPictureSource>(
+            format, [picture](const PicturePlanes& planes, std::chrono::system_clock::time_point time) {
+                picture->draw(planes, time);
+            });
+    };
 }
 
 MakePictures inputPictures(const std::shared_ptr<Input>& input, Input::Branch branch, const TestPictureLook& look) {
@@ -73,6 +86,14 @@ std::string lowPath(std::size_t number) {
     return fullPath(number) + "/low";
 }
 
+std::string webPath(std::size_t number) {
+    return fullPath(number) + "/";
+}
+
+std::string onvifPath(std::size_t number) {
+    return fullPath(number) + "/onvif/device_service";
+}
+
 Publisher::Publisher(Options options) : m_options(std::move(options)) {}
 
 Publisher::~Publisher() = default;
@@ -84,10 +105,15 @@ std::string Publisher::start() {
     if (std::string problem = findInputs(); !problem.empty()) {
         return problem;
     }
+    makeCameras();
     mountSources();
     if (std::string problem = m_server.listen(m_options.port, m_options.loopbackOnly); !problem.empty()) {
         return problem;
     }
+    if (std::string problem = serveSteering(); !problem.empty()) {
+        return problem;
+    }
+    m_host = m_options.loopbackOnly ? "127.0.0.1" : reachableAddress();
     printAddresses();
     announce();
     return {};
@@ -106,14 +132,55 @@ std::string Publisher::findInputs() {
     return {};
 }
 
+void Publisher::makeCameras() {
+    for (const SourceOptions& source : m_options.sources) {
+        m_cameras.push_back(source.ptz ? std::make_shared<Camera>() : nullptr);
+    }
+}
+
+// Of a source without an input.
+MakePictures Publisher::picturesOf(std::size_t number, const PictureFormat& format) const {
+    const std::string& name = m_options.sources[number].name;
+    return m_cameras[number] ? cameraPictures(format, {name, number}, m_cameras[number])
+                             : testPictures(format, {name, {}, number, {}});
+}
+
+std::string Publisher::serveSteering() {
+    if (std::none_of(m_cameras.begin(), m_cameras.end(), [](const auto& camera) { return camera != nullptr; })) {
+        return {};
+    }
+    std::vector<OnvifCamera> cameras;
+    for (std::size_t i = 0; i < m_cameras.size(); ++i) {
+        if (m_cameras[i]) {
+            cameras.push_back(onvifCamera(i));
+        }
+    }
+    m_onvif = std::make_unique<OnvifServer>(m_http, std::move(cameras));
+    return m_http.listen(m_options.httpPort, preferredHttpPort, m_options.loopbackOnly);
+}
+
+OnvifCamera Publisher::onvifCamera(std::size_t number) const {
+    const SourceOptions& source = m_options.sources[number];
+    const PictureFormat full = formatOf(source.size, source.rate, source.codec);
+    const PictureFormat low = formatOf(source.lowSize, source.lowRate, source.codec);
+    const std::string service = onvifPath(number);
+    return {m_options.machine,
+            source.name,
+            service.substr(0, service.rfind('/') + 1),
+            m_cameras[number],
+            {{"full", "Full", fullPath(number), full.size, full.rate, source.codec, bitRateFor(full)},
+             {"low", "Low bandwidth", lowPath(number), low.size, low.rate, source.codec, bitRateFor(low)}},
+            m_server.port()};
+}
+
 void Publisher::mountSources() {
     for (std::size_t i = 0; i < m_options.sources.size(); ++i) {
         const SourceOptions& source = m_options.sources[i];
         const TestPictureLook look{source.name, {}, i, {}};
         const PictureFormat full = formatOf(source.size, source.rate, source.codec);
         const PictureFormat low = formatOf(source.lowSize, source.lowRate, source.codec);
-        MakePictures fullPictures = testPictures(full, look);
-        MakePictures lowPictures = testPictures(low, look);
+        MakePictures fullPictures = picturesOf(i, full);
+        MakePictures lowPictures = picturesOf(i, low);
         std::shared_ptr<Input> input;
         if (!source.input.empty()) {
             const auto sound =
@@ -129,13 +196,25 @@ void Publisher::mountSources() {
     }
 }
 
+std::string Publisher::httpAddress(const std::string& path) const {
+    return "http://" + m_host + ":" + std::to_string(m_http.port()) + path;
+}
+
+std::string Publisher::webAddress(std::size_t number) const {
+    const std::string& given = m_options.sources[number].web;
+    return given.empty() && m_cameras[number] ? httpAddress(webPath(number)) : given;
+}
+
 void Publisher::printAddresses() const {
-    const std::string host = m_options.loopbackOnly ? "127.0.0.1" : reachableAddress();
-    const std::string start = "rtsp://" + host + ":" + std::to_string(m_server.port());
+    const std::string start = "rtsp://" + m_host + ":" + std::to_string(m_server.port());
     for (std::size_t i = 0; i < m_options.sources.size(); ++i) {
         const std::string name = instanceName(m_options.machine, m_options.sources[i].name);
         std::printf("%s%s  %s\n", start.c_str(), fullPath(i).c_str(), name.c_str());
         std::printf("%s%s  %s, low bandwidth\n", start.c_str(), lowPath(i).c_str(), name.c_str());
+        if (m_cameras[i]) {
+            std::printf("%s  %s, control page\n", webAddress(i).c_str(), name.c_str());
+            std::printf("%s  %s, ONVIF\n", httpAddress(onvifPath(i)).c_str(), name.c_str());
+        }
     }
     std::fflush(stdout);
 }
@@ -144,17 +223,23 @@ void Publisher::announce() {
     std::vector<Announcement> announcements;
     for (std::size_t i = 0; i < m_options.sources.size(); ++i) {
         const SourceOptions& source = m_options.sources[i];
-        announcements.push_back({m_options.machine, source.name, fullPath(i), lowPath(i), source.web});
+        announcements.push_back({m_options.machine, source.name, fullPath(i), lowPath(i), webAddress(i),
+                                 m_cameras[i] ? httpAddress(onvifPath(i)) : ""});
     }
     m_announcer = std::make_unique<Announcer>(std::move(announcements), static_cast<std::uint16_t>(m_server.port()),
                                               m_options.loopbackOnly, say);
     if (const std::string problem = m_announcer->start(); !problem.empty()) {
         say(problem + "; the addresses above are served all the same");
     }
+    if (const std::string problem = m_onvif ? m_onvif->announce(m_options.loopbackOnly) : ""; !problem.empty()) {
+        say(problem + "; they can be steered all the same");
+    }
 }
 
 void Publisher::stop() {
     m_announcer.reset();
+    m_onvif.reset();
+    m_http.stop();
     m_server.stop();
 }
 

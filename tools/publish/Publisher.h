@@ -1,9 +1,12 @@
 #pragma once
 
 #include "tools/publish/Announcer.h"
+#include "tools/publish/Camera.h"
+#include "tools/publish/HttpServer.h"
 #include "tools/publish/Input.h"
 #include "tools/publish/Options.h"
 #include "tools/publish/RtspServer.h"
+#include "tools/publish/onvif/OnvifServer.h"
 
 #include <memory>
 #include <string>
@@ -29,13 +32,23 @@ class Publisher {
 
   private:
     [[nodiscard]] std::string findInputs();
+    void makeCameras();
     void mountSources();
+    [[nodiscard]] MakePictures picturesOf(std::size_t number, const PictureFormat& format) const;
+    [[nodiscard]] std::string serveSteering();
+    [[nodiscard]] OnvifCamera onvifCamera(std::size_t number) const;
+    [[nodiscard]] std::string httpAddress(const std::string& path) const;
+    [[nodiscard]] std::string webAddress(std::size_t number) const;
     void printAddresses() const;
     void announce();
 
     Options m_options;
-    std::vector<InputPlace> m_places; // of each source
+    std::vector<InputPlace> m_places;               // of each source
+    std::vector<std::shared_ptr<Camera>> m_cameras; // of each source; null where there is none to steer
+    std::string m_host;                             // at which this machine is reached
     RtspServer m_server;
+    HttpServer m_http; // listens where there are cameras
+    std::unique_ptr<OnvifServer> m_onvif;
     std::unique_ptr<Announcer> m_announcer;
 };
 
@@ -44,5 +57,11 @@ class Publisher {
 
 /** The path of its low-bandwidth stream. */
 [[nodiscard]] std::string lowPath(std::size_t number);
+
+/** The path of a camera's control page. */
+[[nodiscard]] std::string webPath(std::size_t number);
+
+/** The path of a camera's ONVIF device service. */
+[[nodiscard]] std::string onvifPath(std::size_t number);
 
 } // namespace qivo

@@ -1,11 +1,5 @@
 #include "tools/publish/RtspServer.h"
 
-#include <arpa/inet.h>
-#include <array>
-#include <ifaddrs.h>
-#include <net/if.h>
-#include <netinet/in.h>
-
 namespace qivo {
 namespace {
 
@@ -74,24 +68,6 @@ void RtspServer::stop() {
     const Object<GstRTSPSessionPool> sessions(gst_rtsp_server_get_session_pool(m_server.get()));
     const auto removeSession = [](GstRTSPSessionPool*, GstRTSPSession*, gpointer) { return GST_RTSP_FILTER_REMOVE; };
     g_list_free_full(gst_rtsp_session_pool_filter(sessions.get(), removeSession, nullptr), g_object_unref);
-}
-
-std::string reachableAddress() {
-    ifaddrs* list = nullptr;
-    if (getifaddrs(&list) != 0) {
-        return "127.0.0.1";
-    }
-    const std::unique_ptr<ifaddrs, void (*)(ifaddrs*)> owned(list, freeifaddrs);
-    for (const ifaddrs* entry = list; entry != nullptr; entry = entry->ifa_next) {
-        const bool usable = (entry->ifa_flags & IFF_UP) != 0 && (entry->ifa_flags & IFF_LOOPBACK) == 0;
-        if (usable && entry->ifa_addr != nullptr && entry->ifa_addr->sa_family == AF_INET) {
-            std::array<char, INET_ADDRSTRLEN> text{};
-            const void* address = &reinterpret_cast<const sockaddr_in*>(entry->ifa_addr)->sin_addr;
-            inet_ntop(AF_INET, address, text.data(), text.size());
-            return text.data();
-        }
-    }
-    return "127.0.0.1";
 }
 
 } // namespace qivo

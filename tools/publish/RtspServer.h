@@ -36,7 +36,4 @@ class RtspServer {
     guint m_source = 0;
 };
 
-/** An address of this machine that others reach: the first IPv4 address that is not loopback, else 127.0.0.1. */
-[[nodiscard]] std::string reachableAddress();
-
 } // namespace qivo

@@ -5,123 +5,65 @@
 #include <algorithm>
 #include <cmath>
 #include <cstring>
-#include <ctime>
 
 namespace qivo {
 namespace {
 
-constexpr const char* clockCharacters = "0123456789:.";
-constexpr int clockLength = 12;
 constexpr Colour darkGrey{0.1, 0.1, 0.1};
 
 // Standard bars at 75 %, left to right.
 constexpr std::array<Colour, 7> bars{
     {{0.75, 0.75, 0.75}, {0.75, 0.75, 0}, {0, 0.75, 0.75}, {0, 0.75, 0}, {0.75, 0, 0.75}, {0.75, 0, 0}, {0, 0, 0.75}}};
 
-// Steps of the golden ratio around the circle of hues keep any few sources far apart.
-constexpr double hueStep = 0.618034;
-constexpr double firstHue = 0.58;
-
-std::uint8_t blend(std::uint8_t under, std::uint8_t over, int coverage) {
-    return static_cast<std::uint8_t>((under * (255 - coverage) + over * coverage + 127) / 255);
-}
-
 } // namespace
 
-std::string clockText(std::chrono::milliseconds sinceEpoch) {
-    const std::time_t seconds = std::chrono::floor<std::chrono::seconds>(sinceEpoch).count();
-    std::tm local{};
-    localtime_r(&seconds, &local);
-    std::array<char, 16> text{};
-    std::strftime(text.data(), text.size(), "%H:%M:%S.", &local);
-    const auto thousandths = static_cast<int>(sinceEpoch.count() - seconds * 1000);
-    std::string result = text.data();
-    for (const int divisor : {100, 10, 1}) {
-        result += static_cast<char>('0' + thousandths / divisor % 10);
-    }
-    return result;
-}
-
-TestPicture::TestPicture(PictureSize size, const TestPictureLook& look) : m_size(size), m_space(look.space) {
+TestPicture::TestPicture(PictureSize size, const TestPictureLook& look)
+    : m_size(size), m_space(look.space), m_clock(size.width, timeCodeTop(size.height) - areaTop(clockTop)),
+      m_dark(toYCbCr(darkGrey, look.space)[0]) {
     const std::size_t chroma = static_cast<std::size_t>(size.width / 2) * (size.height / 2);
     m_still[0].resize(static_cast<std::size_t>(size.width) * size.height);
     m_still[1].resize(chroma);
     m_still[2].resize(chroma);
-    fill(0, 0, size.width, size.height, darkGrey);
-    m_dark = toYCbCr(darkGrey, m_space)[0];
+    fillArea(still(), {0, 0, size.width, size.height}, darkGrey, m_space);
     if (look.note.empty()) {
         drawBars();
     } else {
         drawNote(look.note);
     }
     drawName(look);
-    prepareClock();
 }
 
 int TestPicture::areaTop(int eighteenths) const {
     return m_size.height * eighteenths / areaDivisor & ~1;
 }
 
-void TestPicture::fill(int left, int top, int right, int bottom, const Colour& colour) {
-    const auto samples = toYCbCr(colour, m_space);
-    for (std::size_t plane = 0; plane < 3; ++plane) {
-        const int shift = plane == 0 ? 0 : 1;
-        const int width = m_size.width >> shift;
-        for (int y = top >> shift; y < bottom >> shift; ++y) {
-            std::memset(&m_still[plane][static_cast<std::size_t>(y) * width + (left >> shift)], samples[plane],
-                        (right >> shift) - (left >> shift));
-        }
-    }
+PicturePlanes TestPicture::still() {
+    return {{m_still[0].data(), m_still[1].data(), m_still[2].data()},
+            {m_size.width, m_size.width / 2, m_size.width / 2}};
 }
 
 void TestPicture::drawBars() {
     const int count = static_cast<int>(bars.size());
     for (int i = 0; i < count; ++i) {
-        fill(m_size.width * i / count & ~1, 0, m_size.width * (i + 1) / count & ~1, areaTop(runnerTop), bars[i]);
+        const PictureArea area{m_size.width * i / count & ~1, 0, m_size.width * (i + 1) / count & ~1,
+                               areaTop(runnerTop)};
+        fillArea(still(), area, bars[i], m_space);
     }
 }
 
 void TestPicture::drawNote(const std::string& note) {
     const int margin = m_size.width / 20;
     const TextMask mask = renderText(note, m_size.width - 2 * margin, m_size.height * 2 / areaDivisor);
-    drawText(mask, (m_size.width - mask.width) / 2, areaTop(runnerTop / 2) - mask.height / 2);
+    drawText(still(), m_size, mask, (m_size.width - mask.width) / 2, areaTop(runnerTop / 2) - mask.height / 2, m_space);
 }
 
 void TestPicture::drawName(const TestPictureLook& look) {
     const int top = areaTop(nameTop);
     const int bottom = areaTop(clockTop);
-    fill(0, top, m_size.width, bottom, fromHue(firstHue + hueStep * static_cast<double>(look.hue), 0.85, 0.6));
+    fillArea(still(), {0, top, m_size.width, bottom}, bandColour(look.hue), m_space);
     const int margin = m_size.width / 20;
     const TextMask mask = renderText(look.name, m_size.width - 2 * margin, bottom - top);
-    drawText(mask, (m_size.width - mask.width) / 2, top);
-}
-
-void TestPicture::drawText(const TextMask& mask, int left, int top) {
-    const int width = m_size.width;
-    const int right = std::min(width, left + mask.width);
-    const int bottom = std::min(m_size.height, top + mask.height);
-    const auto coverage = [&](int x, int y) {
-        return mask.coverage[static_cast<std::size_t>(y - top) * mask.width + (x - left)];
-    };
-    for (int y = top; y < bottom; ++y) {
-        for (int x = left; x < right; ++x) {
-            std::uint8_t& luma = m_still[0][static_cast<std::size_t>(y) * width + x];
-            luma = blend(luma, m_space.white(), coverage(x, y));
-            if (x % 2 == 0 && y % 2 == 0) {
-                const std::size_t at = static_cast<std::size_t>(y / 2) * (width / 2) + x / 2;
-                m_still[1][at] = blend(m_still[1][at], 128, coverage(x, y));
-                m_still[2][at] = blend(m_still[2][at], 128, coverage(x, y));
-            }
-        }
-    }
-}
-
-void TestPicture::prepareClock() {
-    const int height = timeCodeTop(m_size.height) - areaTop(clockTop);
-    for (std::size_t i = 0; i < m_glyphs.size(); ++i) {
-        m_glyphs[i] = renderText(std::string(1, clockCharacters[i]), m_size.width / clockLength, height);
-        m_glyphWidth = std::max(m_glyphWidth, m_glyphs[i].width);
-    }
+    drawText(still(), m_size, mask, (m_size.width - mask.width) / 2, top, m_space);
 }
 
 void TestPicture::draw(const PicturePlanes& planes, std::chrono::system_clock::time_point time) {
@@ -168,20 +110,9 @@ void TestPicture::drawRunner(const PicturePlanes& planes, std::chrono::milliseco
 }
 
 void TestPicture::drawClock(const PicturePlanes& planes, std::chrono::milliseconds time) const {
-    const int top = areaTop(clockTop);
-    int left = (m_size.width - clockLength * m_glyphWidth) / 2;
-    for (const char character : clockText(time)) {
-        const TextMask& glyph = m_glyphs[std::strchr(clockCharacters, character) - clockCharacters];
-        const int start = left + (m_glyphWidth - glyph.width) / 2;
-        for (int y = 0; y < glyph.height; ++y) {
-            std::uint8_t* row = planes.data[0] + (top + y) * planes.stride[0] + start;
-            const std::uint8_t* coverage = &glyph.coverage[static_cast<std::size_t>(y) * glyph.width];
-            for (int x = 0; x < glyph.width; ++x) {
-                row[x] = blend(m_dark, m_space.white(), coverage[x]);
-            }
-        }
-        left += m_glyphWidth;
-    }
+    const int left = (m_size.width - m_clock.width()) / 2;
+    m_clock.draw(planes.data[0] + areaTop(clockTop) * planes.stride[0] + left, planes.stride[0], time, m_dark,
+                 m_space.white());
 }
 
 } // namespace qivo

@@ -1,8 +1,6 @@
 #pragma once
 
-#include "tools/publish/Colour.h"
-#include "tools/publish/Options.h"
-#include "tools/publish/TextMask.h"
+#include "tools/publish/Planes.h"
 
 #include <array>
 #include <chrono>
@@ -12,12 +10,6 @@
 #include <vector>
 
 namespace qivo {
-
-/** The three planes of an I420 picture: luma, then Cb and Cr of half its width and height. */
-struct PicturePlanes {
-    std::array<std::uint8_t*, 3> data{};
-    std::array<std::ptrdiff_t, 3> stride{};
-};
 
 /** What a test picture says and in which colours. */
 struct TestPictureLook {
@@ -51,24 +43,18 @@ class TestPicture {
     [[nodiscard]] int areaTop(int eighteenths) const;
 
   private:
-    void fill(int left, int top, int right, int bottom, const Colour& colour);
+    [[nodiscard]] PicturePlanes still();
     void drawBars();
     void drawNote(const std::string& note);
     void drawName(const TestPictureLook& look);
-    void prepareClock();
-    void drawText(const TextMask& mask, int left, int top);
     void drawRunner(const PicturePlanes& planes, std::chrono::milliseconds time) const;
     void drawClock(const PicturePlanes& planes, std::chrono::milliseconds time) const;
 
     PictureSize m_size;
     ColourSpace m_space;
     std::array<std::vector<std::uint8_t>, 3> m_still; // what never changes, without padding
-    std::array<TextMask, 12> m_glyphs;                // digits, colon, point
-    int m_glyphWidth = 0;
-    std::uint8_t m_dark = 0; // luma behind the runner and the clock
+    ClockFace m_clock;
+    std::uint8_t m_dark; // luma behind the runner and the clock
 };
-
-/** A time of day as the clock shows it: hh:mm:ss.mmm, local time. */
-[[nodiscard]] std::string clockText(std::chrono::milliseconds sinceEpoch);
 
 } // namespace qivo
