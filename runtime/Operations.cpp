@@ -2,6 +2,7 @@
 
 #include "runtime/Finder.h"
 #include "runtime/Library.h"
+#include "runtime/Steering.h"
 #include "sdk/qivo.h"
 
 #include <chrono>
@@ -11,6 +12,7 @@
 using qivo::runtime::Finder;
 using qivo::runtime::Library;
 using qivo::runtime::Receiver;
+using qivo::runtime::Steering;
 
 namespace {
 
@@ -20,6 +22,12 @@ Library& library() {
 
 std::shared_ptr<Receiver> receiver(QIVOlib_recv_instance_t handle) {
     return library().receivers.find(handle);
+}
+
+/// Null if the handle is refused or no camera has been found.
+std::shared_ptr<Steering> steering(QIVOlib_recv_instance_t handle) {
+    const auto found = receiver(handle);
+    return found ? found->steering() : nullptr;
 }
 
 } // namespace
@@ -108,34 +116,38 @@ void QIVOlib_recv_get_queue(QIVOlib_recv_instance_t p_instance, QIVOlib_recv_que
     }
 }
 
-// No camera is steered yet: every source is one that takes no commands, and a command is refused.
-
-bool QIVOlib_recv_ptz_is_supported(QIVOlib_recv_instance_t) {
-    return false;
+bool QIVOlib_recv_ptz_is_supported(QIVOlib_recv_instance_t p_instance) {
+    return steering(p_instance) != nullptr;
 }
 
-bool QIVOlib_recv_ptz_zoom_speed(QIVOlib_recv_instance_t, float) {
-    return false;
+bool QIVOlib_recv_ptz_zoom_speed(QIVOlib_recv_instance_t p_instance, float zoom_speed) {
+    const auto found = steering(p_instance);
+    return found && found->zoom(zoom_speed);
 }
 
-bool QIVOlib_recv_ptz_pan_tilt_speed(QIVOlib_recv_instance_t, float, float) {
-    return false;
+bool QIVOlib_recv_ptz_pan_tilt_speed(QIVOlib_recv_instance_t p_instance, float pan_speed, float tilt_speed) {
+    const auto found = steering(p_instance);
+    return found && found->panTilt(pan_speed, tilt_speed);
 }
 
-bool QIVOlib_recv_ptz_auto_focus(QIVOlib_recv_instance_t) {
-    return false;
+bool QIVOlib_recv_ptz_auto_focus(QIVOlib_recv_instance_t p_instance) {
+    const auto found = steering(p_instance);
+    return found && found->autoFocus();
 }
 
-bool QIVOlib_recv_ptz_focus(QIVOlib_recv_instance_t, float) {
-    return false;
+bool QIVOlib_recv_ptz_focus(QIVOlib_recv_instance_t p_instance, float focus_value) {
+    const auto found = steering(p_instance);
+    return found && found->focus(focus_value);
 }
 
-bool QIVOlib_recv_ptz_store_preset(QIVOlib_recv_instance_t, int32_t) {
-    return false;
+bool QIVOlib_recv_ptz_store_preset(QIVOlib_recv_instance_t p_instance, int32_t preset_no) {
+    const auto found = steering(p_instance);
+    return found && found->store(preset_no);
 }
 
-bool QIVOlib_recv_ptz_recall_preset(QIVOlib_recv_instance_t, int32_t, float) {
-    return false;
+bool QIVOlib_recv_ptz_recall_preset(QIVOlib_recv_instance_t p_instance, int32_t preset_no, float speed) {
+    const auto found = steering(p_instance);
+    return found && found->recall(preset_no, speed);
 }
 
 } // extern "C"

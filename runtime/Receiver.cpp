@@ -106,4 +106,8 @@ void Receiver::freeString(const char* text) {
     m_strings.erase(text);
 }
 
+std::shared_ptr<Steering> Receiver::steering() const {
+    return m_loop->steering();
+}
+
 } // namespace qivo::runtime

@@ -16,6 +16,7 @@
 namespace qivo::runtime {
 
 class ReceiverLoop;
+class Steering;
 
 /// What stands behind a receiver handle.
 ///
@@ -51,6 +52,9 @@ class Receiver {
     const char* webControl();
     /// Anything that was not handed out is ignored.
     void freeString(const char* text);
+
+    /// What steers the source's camera; null if no camera has been found.
+    std::shared_ptr<Steering> steering() const;
 
   private:
     explicit Receiver(std::shared_ptr<ReceiverLoop> loop);

@@ -13,6 +13,15 @@ RtspSession::Failure broken(std::string reason) {
     return {RtspSession::Failure::Kind::broken, std::move(reason)};
 }
 
+/// The page of the machine that the address is on.
+std::string pageOf(const std::string& address) {
+    auto parts = urlParts(address);
+    if (parts) {
+        parts->path.assign(1, '/');
+    }
+    return parts ? urlOf(*parts) : std::string();
+}
+
 ReceiverLoop::Clock::duration stallLimit(const RtspSession& session) {
     return std::max<ReceiverLoop::Clock::duration>(kStallLimit, kStallIntervals * session.packetInterval());
 }
@@ -26,11 +35,20 @@ void ReceiverLoop::stop() {
     m_stopped = true;
     m_mailbox->close();
     m_wakeup->notify();
+    const std::lock_guard guard(m_mutex);
+    if (m_steering) {
+        m_steering->end();
+    }
 }
 
 std::string ReceiverLoop::webControl() const {
     const std::lock_guard guard(m_mutex);
-    return m_web;
+    return m_web.empty() && m_steering && m_steering->isSupported() ? pageOf(m_steering->target().device) : m_web;
+}
+
+std::shared_ptr<Steering> ReceiverLoop::steering() const {
+    const std::lock_guard guard(m_mutex);
+    return m_steering && m_steering->isSupported() ? m_steering : nullptr;
 }
 
 void ReceiverLoop::run() {
@@ -85,6 +103,27 @@ void ReceiverLoop::refreshAnnouncement() {
     if (told) {
         m_mailbox->raiseStatus();
     }
+    steer();
+}
+
+/// Looks for the camera behind the source, anew where the announcement leads elsewhere or where none was found. The
+/// sound of a source is received beside its picture, which is enough to steer by.
+void ReceiverLoop::steer() {
+    if (m_request.bandwidth == QIVOlib_recv_bandwidth_audio_only) {
+        return;
+    }
+    auto target = steeringTarget(m_request, m_announcement, m_shown);
+    const std::lock_guard guard(m_mutex);
+    if (m_stopped || (target && m_steering && !m_steering->isOver() && m_steering->target() == *target)) {
+        return;
+    }
+    if (m_steering) {
+        m_steering->end();
+        m_steering.reset();
+    }
+    if (target) {
+        m_steering = Steering::start(std::move(*target), [mailbox = m_mailbox] { mailbox->raiseStatus(); });
+    }
 }
 
 std::string ReceiverLoop::target(bool first) const {
@@ -125,6 +164,8 @@ ReceiverLoop::Outcome ReceiverLoop::watch(const RtspSession& session, const std:
                 m_environment.transports->remember(sourceKey(url));
             }
             m_mailbox->raiseStatus();
+            m_shown = true;
+            steer();
         }
         if (auto outcome = judge(session, began, url)) {
             return *outcome;

@@ -4,6 +4,7 @@
 #include "runtime/Mailbox.h"
 #include "runtime/Receiver.h"
 #include "runtime/RtspSession.h"
+#include "runtime/Steering.h"
 #include "runtime/Wakeup.h"
 
 #include <atomic>
@@ -46,8 +47,12 @@ class ReceiverLoop {
     /// Ends the loop. Returns at once.
     void stop();
     Mailbox& mailbox() { return *m_mailbox; }
-    /// The address of the source's control page; empty if there is none.
+    /// The address of the source's control page; empty if there is none. A camera that can be steered and announces
+    /// none is taken to have one at the root of its device service: applications ask for steering only where there is
+    /// such an address.
     std::string webControl() const;
+    /// What steers the source's camera; null if no camera has been found.
+    std::shared_ptr<Steering> steering() const;
 
   private:
     /// What came of an attempt.
@@ -60,6 +65,7 @@ class ReceiverLoop {
 
     void refreshAnnouncement();
     std::string target(bool first) const;
+    void steer();
     Outcome attempt(const std::string& url, bool tcp);
     Outcome watch(const RtspSession& session, const std::string& url, bool tcp);
     void end(std::shared_ptr<RtspSession> session);
@@ -85,12 +91,14 @@ class ReceiverLoop {
     Clock::time_point m_nextAttempt{};
     bool m_first = true;    ///< no attempt has been made
     bool m_nextTcp = false; ///< the last attempt got consent over UDP and nothing more
+    bool m_shown = false;   ///< the source has been connected
     bool m_hurry = false;   ///< the source has been announced, or announced differently, since the last attempt
     std::string m_reported; ///< the failure that was last logged
 
     mutable std::mutex m_mutex; // protects the rest
     std::string m_web;
     std::string m_onvif;
+    std::shared_ptr<Steering> m_steering;
 };
 
 } // namespace qivo::runtime

@@ -2,6 +2,7 @@
 
 #include "runtime/BackgroundThreads.h"
 #include "runtime/Receiver.h"
+#include "tests/runtime/Patience.h"
 #include "tests/runtime/RtspServer.h"
 
 #include <gtest/gtest.h>
@@ -19,19 +20,6 @@ namespace qivo::test {
 
 using namespace std::chrono_literals;
 using Clock = std::chrono::steady_clock;
-
-/// How many times longer things may take where a sanitizer watches.
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-inline constexpr int kSanitizerPatience = 10;
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-inline constexpr int kSanitizerPatience = 10;
-#else
-inline constexpr int kSanitizerPatience = 1;
-#endif
-#else
-inline constexpr int kSanitizerPatience = 1;
-#endif
 
 /// Announcements that a test makes.
 class ScriptedView final : public runtime::SourceView {

@@ -1,0 +1,100 @@
+#pragma once
+
+#include "tests/runtime/RawServer.h"
+
+#include <chrono>
+#include <functional>
+#include <map>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace qivo::test {
+
+/// One request as the camera received it.
+struct CameraCall {
+    std::string operation; ///< local name of the body's element, e.g. "ContinuousMove"
+    std::string path;
+    std::string header; ///< of HTTP, complete
+    std::string body;
+    std::chrono::steady_clock::time_point at;
+
+    /// The value of the attribute or the text of the element that follows the given text; empty if it is not there.
+    std::string after(const std::string& text) const;
+};
+
+/// A camera on loopback that moves, and that a test can make as odd as cameras are.
+class ScriptedCamera {
+  public:
+    using Clock = std::chrono::steady_clock;
+    /// Treats a request in its own way; false leaves it to the camera.
+    using Quirk = std::function<bool(ScriptedCamera&, Connection&, const CameraCall&)>;
+    /// Changes an answer's document.
+    using Rewrite = std::function<std::string(std::string)>;
+
+    struct Speed {
+        float pan = 0;
+        float tilt = 0;
+        float zoom = 0;
+        bool operator==(const Speed&) const = default;
+    };
+
+    /// Everything is set before the first request. Port 0: any.
+    explicit ScriptedCamera(Quirk quirk = nullptr, int port = 0);
+
+    std::string url(const std::string& path = "/onvif/device_service", const std::string& login = "") const;
+    int port() const { return m_server.port(); }
+
+    /// Answers with a document; complete with header, fit to be sent.
+    static std::string http(const std::string& xml, const std::string& status = "200 OK",
+                            const std::string& lines = "");
+    static std::string fault(const std::string& reason);
+    static std::string envelope(const std::string& body);
+    /// What the camera answers by itself; it does what it is asked.
+    std::string answerTo(const CameraCall& call);
+
+    Rewrite rewrite;
+    bool chunked = false;
+    bool ignoresRunOut = false; ///< moves on until it is told to stop
+    bool namesPresets = true;
+    std::string streamPath = "/live"; ///< of the profile that can be steered
+    std::string servicesAt;           ///< scheme, host and port of the services; empty: where it was asked
+    std::chrono::seconds clockAhead{0};
+
+    /// Speeds by which it moves now.
+    Speed speed() const;
+    bool moves() const { return speed() != Speed{}; }
+    std::vector<CameraCall> calls(const std::string& operation = "") const;
+    int count(const std::string& operation) const { return static_cast<int>(calls(operation).size()); }
+    std::string lastRecalled() const;
+
+    /// Waits until the condition holds.
+    static bool until(const std::function<bool()>& condition,
+                      std::chrono::milliseconds limit = std::chrono::seconds(8));
+
+  private:
+    void serve(Connection& connection);
+    void send(Connection& connection, const std::string& xml) const;
+    std::string capabilities() const;
+    std::string profiles() const;
+    std::string presets() const;
+    void move(const CameraCall& call);
+    void stop(bool panTilt, bool zoom);
+    std::string store(const CameraCall& call);
+
+    Quirk m_quirk;
+    mutable std::mutex m_mutex; // protects the rest
+    std::vector<CameraCall> m_calls;
+    Speed m_speed;
+    Clock::time_point m_runOut{};
+    std::map<std::string, std::string> m_presets; // token, name
+    std::string m_recalled;
+
+    RawServer m_server; // ends first: its threads use what is above
+};
+
+/// The parameter of an Authorization header or a challenge, without its quotes.
+std::string parameterOf(const std::string& header, const std::string& name);
+
+} // namespace qivo::test

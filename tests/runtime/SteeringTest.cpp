@@ -1,0 +1,244 @@
+// A camera is steered, by the clock: scripted cameras on loopback.
+
+#include "runtime/BackgroundThreads.h"
+#include "tests/runtime/SteeringFixture.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <string>
+#include <vector>
+
+namespace qivo::test {
+namespace {
+
+using Calls = std::vector<CameraCall>;
+
+/// Keeps the first request for an operation without an answer until the camera ends.
+ScriptedCamera::Quirk hangsOn(const std::string& operation) {
+    return [operation, hung = std::make_shared<std::atomic<bool>>(false)](ScriptedCamera&, Connection& connection,
+                                                                          const CameraCall& call) {
+        if (call.operation != operation || hung->exchange(true)) {
+            return false;
+        }
+        connection.untilClosed();
+        return true;
+    };
+}
+
+TEST_F(SteeringCameraTest, CommandsReachTheCamera) {
+    ScriptedCamera camera;
+    const auto steering = steer(camera);
+    ASSERT_TRUE(found(*steering));
+    EXPECT_TRUE(steering->panTilt(0.5F, 0.25F));
+    ASSERT_TRUE(camera.until([&] {
+        return camera.speed() == ScriptedCamera::Speed{-0.5F, 0.25F, 0};
+    })) << "left is positive here and negative there";
+    EXPECT_TRUE(steering->zoom(-1));
+    ASSERT_TRUE(camera.until([&] { return camera.speed() == ScriptedCamera::Speed{-0.5F, 0.25F, -1}; }));
+    EXPECT_TRUE(steering->zoom(0));
+    ASSERT_TRUE(camera.until([&] { return camera.speed() == ScriptedCamera::Speed{-0.5F, 0.25F, 0}; }));
+    EXPECT_TRUE(steering->panTilt(0, 0));
+    ASSERT_TRUE(camera.until([&] { return !camera.moves(); }));
+    for (const CameraCall& call : camera.calls("ContinuousMove")) {
+        EXPECT_EQ(call.after("ProfileToken>"), "dome");
+        EXPECT_EQ(call.after("Timeout>"), "PT1S");
+    }
+}
+
+TEST_F(SteeringCameraTest, WhatTheCameraIsIsAskedOnce) {
+    ScriptedCamera camera;
+    const auto steering = steer(camera);
+    ASSERT_TRUE(found(*steering));
+    EXPECT_TRUE(steering->store(3));
+    EXPECT_TRUE(steering->recall(3, 0.25F));
+    EXPECT_TRUE(steering->focus(0.5F));
+    EXPECT_TRUE(steering->autoFocus());
+    ASSERT_TRUE(camera.until([&] { return camera.count("SetImagingSettings") == 2; }));
+    for (const char* once : {"GetSystemDateAndTime", "GetCapabilities", "GetProfiles", "GetNodes", "GetPresets",
+                             "GetMoveOptions", "SetPreset", "GotoPreset", "Move"}) {
+        EXPECT_EQ(camera.count(once), 1) << once;
+    }
+    const Calls settings = camera.calls("SetImagingSettings");
+    EXPECT_EQ(settings[0].after("AutoFocusMode>"), "MANUAL");
+    EXPECT_EQ(settings[1].after("AutoFocusMode>"), "AUTO");
+    EXPECT_EQ(camera.calls("Move")[0].after("Position>"), "15.0000") << "the middle of 10 to 20";
+    EXPECT_EQ(camera.calls("Move")[0].after("VideoSourceToken>"), "source-1");
+    EXPECT_EQ(camera.calls("SetPreset")[0].after("PresetName>"), "QIVO 3");
+    EXPECT_EQ(camera.calls("GotoPreset")[0].after("PresetToken>"), "slotA");
+    EXPECT_EQ(camera.calls("GotoPreset")[0].after("Speed><tt:PanTilt x=\""), "0.2500");
+}
+
+TEST_F(SteeringCameraTest, NothingIsAcceptedThatTheCameraCannotDo) {
+    ScriptedCamera camera([](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
+        const std::string nodes = "<R><tptz:PTZNode token=\"node\"><tt:SupportedPTZSpaces>"
+                                  "<tt:ContinuousPanTiltVelocitySpace/></tt:SupportedPTZSpaces></tptz:PTZNode></R>";
+        return call.operation == "GetNodes"         ? connection.send(self.http(self.envelope(nodes)))
+               : call.operation == "GetMoveOptions" ? connection.send(self.http(self.fault("no focus")))
+                                                    : false;
+    });
+    const auto steering = steer(camera);
+    ASSERT_TRUE(found(*steering));
+    EXPECT_FALSE(steering->zoom(0.5F));
+    EXPECT_FALSE(steering->focus(0.5F));
+    EXPECT_TRUE(steering->panTilt(0.5F, 0));
+    EXPECT_TRUE(steering->autoFocus());
+    EXPECT_TRUE(steering->recall(4, 0.25F));
+    EXPECT_FALSE(steering->store(-1));
+    EXPECT_FALSE(steering->recall(1000, 0.25F));
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetPresets") == 2; })) << "somebody else may have stored it";
+    EXPECT_TRUE(steering->panTilt(0, 0));
+    ASSERT_TRUE(camera.until([&] { return camera.count("Stop") == 1; }));
+    EXPECT_EQ(camera.calls("Stop")[0].after("PanTilt>"), "true");
+    EXPECT_EQ(camera.calls("Stop")[0].after("Zoom>"), "false");
+    EXPECT_EQ(camera.count("GotoPreset"), 0);
+}
+
+TEST_F(SteeringCameraTest, AMoveHoldsUntilItIsStopped) {
+    ScriptedCamera camera;
+    const auto steering = steer(camera);
+    ASSERT_TRUE(found(*steering));
+    const auto began = Clock::now();
+    EXPECT_TRUE(steering->panTilt(0.1F, 0));
+    ASSERT_TRUE(camera.until([&] { return camera.moves(); }));
+    while (Clock::now() < began + 1500ms) {
+        ASSERT_TRUE(camera.moves()) << "after " << (Clock::now() - began) / 1ms << " ms";
+        std::this_thread::sleep_for(10ms);
+    }
+    EXPECT_GE(camera.count("ContinuousMove"), 3);
+    EXPECT_TRUE(steering->panTilt(0, 0));
+    ASSERT_TRUE(camera.until([&] { return !camera.moves(); }));
+}
+
+TEST_F(SteeringCameraTest, AStopIsOnTheWireWithin50Ms) {
+    ScriptedCamera camera;
+    const auto steering = steer(camera);
+    ASSERT_TRUE(found(*steering));
+    for (int i = 1; i <= 5; ++i) {
+        EXPECT_TRUE(steering->panTilt(0.1F, 0));
+        ASSERT_TRUE(camera.until([&] { return camera.moves(); }));
+        const int moves = camera.count("ContinuousMove");
+        const auto called = Clock::now();
+        EXPECT_TRUE(steering->panTilt(0, 0));
+        EXPECT_LT(Clock::now() - called, 5ms * kSanitizerPatience) << "the caller waits for nothing";
+        ASSERT_TRUE(camera.until([&] { return camera.count("Stop") >= i && !camera.moves(); }));
+        ASSERT_TRUE(camera.until([&] { return camera.count("ContinuousMove") > moves; }));
+        EXPECT_LT(camera.calls("Stop").back().at - called, kStopOnWire);
+        EXPECT_LT(camera.calls("ContinuousMove").back().at - called, kStopOnWire);
+        EXPECT_EQ(camera.calls("ContinuousMove").back().after("PanTilt x=\""), "0.0000");
+        ASSERT_TRUE(settled(camera));
+    }
+}
+
+TEST_F(SteeringCameraTest, AStopDoesNotWaitForAnEarlierRequestThatHangs) {
+    for (const char* operation : {"ContinuousMove", "SetPreset"}) {
+        ScriptedCamera camera(hangsOn(operation));
+        const auto steering = steer(camera);
+        ASSERT_TRUE(found(*steering));
+        EXPECT_TRUE(steering->store(1));
+        EXPECT_TRUE(steering->panTilt(0.1F, 0));
+        ASSERT_TRUE(camera.until([&] { return camera.count(operation) == 1; }));
+        const auto called = Clock::now();
+        EXPECT_TRUE(steering->panTilt(0, 0));
+        ASSERT_TRUE(camera.until([&] { return camera.count("Stop") >= 1; }));
+        EXPECT_LT(camera.calls("Stop")[0].at - called, kStopOnWire) << operation;
+    }
+}
+
+/// The camera reads the move first and does it last.
+TEST_F(SteeringCameraTest, AMoveThatTakesEffectAfterItsStopIsStoppedAgain) {
+    auto late = std::make_shared<std::atomic<bool>>(false);
+    ScriptedCamera camera([late](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
+        if (call.operation != "ContinuousMove" || late->exchange(true)) {
+            return false;
+        }
+        self.until([&] { return self.count("Stop") == 1; });
+        std::this_thread::sleep_for(100ms);
+        connection.send(self.http(self.answerTo(call)));
+        return true;
+    });
+    camera.ignoresRunOut = true;
+    const auto steering = steer(camera);
+    ASSERT_TRUE(found(*steering));
+    EXPECT_TRUE(steering->zoom(1));
+    ASSERT_TRUE(camera.until([&] { return camera.count("ContinuousMove") == 1; }));
+    EXPECT_TRUE(steering->zoom(0));
+    ASSERT_TRUE(camera.until([&] { return camera.count("Stop") >= 2 && !camera.moves(); }));
+    EXPECT_TRUE(settled(camera));
+}
+
+TEST_F(SteeringCameraTest, AStopThatIsLostIsAskedAgain) {
+    auto lost = std::make_shared<std::atomic<int>>(0);
+    ScriptedCamera camera([lost](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
+        const bool stops = call.operation == "Stop" || call.after("PanTilt x=\"") == "0.0000";
+        if (!stops || ++*lost > 4) {
+            return false;
+        }
+        *lost % 2 == 0 ? connection.close() : static_cast<void>(connection.send(self.http(self.fault("busy"))));
+        return true;
+    });
+    camera.ignoresRunOut = true;
+    const auto steering = steer(camera);
+    ASSERT_TRUE(found(*steering));
+    EXPECT_TRUE(steering->panTilt(0.1F, 0));
+    ASSERT_TRUE(camera.until([&] { return camera.moves(); }));
+    EXPECT_TRUE(steering->panTilt(0, 0));
+    EXPECT_TRUE(camera.until([&] { return !camera.moves(); }));
+    EXPECT_TRUE(settled(camera));
+}
+
+TEST_F(SteeringCameraTest, TheEndLeavesTheCameraStanding) {
+    for (const bool ignoresRunOut : {false, true}) {
+        ScriptedCamera camera;
+        camera.ignoresRunOut = ignoresRunOut;
+        auto steering = steer(camera);
+        ASSERT_TRUE(found(*steering));
+        EXPECT_TRUE(steering->panTilt(1, 1));
+        EXPECT_TRUE(steering->zoom(1));
+        ASSERT_TRUE(camera.until([&] { return camera.speed() == ScriptedCamera::Speed{-1, 1, 1}; }));
+        const auto called = Clock::now();
+        steering->end();
+        steering.reset();
+        EXPECT_LT(Clock::now() - called, 5ms * kSanitizerPatience);
+        ASSERT_TRUE(camera.until([&] { return !camera.moves(); }));
+        EXPECT_LT(Clock::now() - called, 1s);
+        EXPECT_TRUE(runtime::BackgroundThreads::waitForAll(2s * kSanitizerPatience));
+    }
+}
+
+TEST_F(SteeringCameraTest, ACommandNeverWaitsForTheCamera) {
+    ScriptedCamera camera(hangsOn("ContinuousMove"));
+    const auto steering = steer(camera);
+    ASSERT_TRUE(found(*steering));
+    for (int i = 0; i < 50; ++i) {
+        const auto called = Clock::now();
+        EXPECT_TRUE(steering->panTilt(0.01F * static_cast<float>(i + 1), 0));
+        EXPECT_LT(Clock::now() - called, 5ms * kSanitizerPatience);
+    }
+    ASSERT_TRUE(camera.until([&] { return camera.count("ContinuousMove") >= 2; }));
+    EXPECT_EQ(camera.calls("ContinuousMove").back().after("PanTilt x=\""), "-0.5000") << "the newest speed alone";
+}
+
+TEST_F(SteeringCameraTest, ADeviceThatIsSwitchedOnLaterIsFound) {
+    int port = 0;
+    {
+        const ScriptedCamera reserved;
+        port = reserved.port();
+    }
+    auto steering = steer("http://127.0.0.1:" + std::to_string(port) + "/onvif/device_service");
+    std::this_thread::sleep_for(100ms);
+    EXPECT_FALSE(steering->isOver());
+    const ScriptedCamera camera(nullptr, port);
+    EXPECT_TRUE(found(*steering));
+    EXPECT_EQ(m_changes, 1);
+}
+
+TEST_F(SteeringCameraTest, AUsualServiceThatIsNotThereIsAskedOnce) {
+    auto steering = steer("http://127.0.0.1:1/onvif/device_service", false);
+    EXPECT_TRUE(ScriptedCamera::until([&] { return steering->isOver(); }));
+    EXPECT_FALSE(steering->isSupported());
+    EXPECT_EQ(m_changes, 0);
+}
+
+} // namespace
+} // namespace qivo::test
