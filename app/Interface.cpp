@@ -6,6 +6,7 @@
 #include "app/ViewController.h"
 #include "app/WindowController.h"
 #include "platform/Application.h"
+#include "ptz/PTZPanel.h"
 
 #include "ui_MainWindow.h"
 #include "ui_TitleBarAccessory.h"
@@ -23,11 +24,16 @@ Interface::Interface()
     m_window->setContentViewController(m_viewController.get());
     loadMenus();
     loadTitleBar();
+    loadSegues();
     m_viewController->viewDidLoad();
     m_windowController->windowDidLoad();
 }
 
 Interface::~Interface() = default;
+
+PTZPanel* Interface::ptzPanel() const {
+    return m_ptzPanel && m_ptzPanel->isVisible() ? m_ptzPanel.data() : nullptr;
+}
 
 void Interface::loadMenus() {
     takeTags();
@@ -100,6 +106,23 @@ void Interface::loadTitleBar() {
         control->setFixedHeight(m_ui->menuBar->sizeHint().height());
     }
     m_windowController->setAccessoryView(std::move(view));
+}
+
+void Interface::loadSegues() {
+    connect(m_viewController.get(), &ViewController::seguePerformed, this, [this](const QString& identifier) {
+        if (identifier == QLatin1String("PTZSegue")) {
+            showPTZPanel();
+        }
+    });
+}
+
+/// One panel at a time: asked for again, it comes to the front.
+void Interface::showPTZPanel() {
+    if (ptzPanel() == nullptr) {
+        m_ptzPanel = std::make_unique<PTZPanel>(m_window.get()).release(); // the window owns it
+        connect(m_window.get(), &MainWindow::willClose, m_ptzPanel, &QWidget::close);
+    }
+    m_ptzPanel->present();
 }
 
 } // namespace qivo

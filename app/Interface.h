@@ -4,6 +4,7 @@
 
 #include <QList>
 #include <QObject>
+#include <QPointer>
 
 #include <memory>
 
@@ -14,6 +15,7 @@ class MainWindow;
 namespace qivo {
 
 class MainWindow;
+class PTZPanel;
 class ViewController;
 class WindowController;
 
@@ -33,6 +35,8 @@ class Interface : public QObject {
     MainWindow& window() { return *m_window; }
     WindowController& windowController() { return *m_windowController; }
     ViewController& viewController() { return *m_viewController; }
+    /// The panel for the camera; null while it is not open.
+    PTZPanel* ptzPanel() const;
 
     /// Enables and disables a menu's commands as the controller says. Entries without a command stay as they are.
     void validateMenu(QMenu* menu) const;
@@ -40,6 +44,8 @@ class Interface : public QObject {
   private:
     void loadMenus();
     void loadTitleBar();
+    void loadSegues();
+    void showPTZPanel();
     void takeTags();
     void addCommand(QAction* item, void (AppDelegate::*command)());
     void validateAllMenus() const;
@@ -49,7 +55,8 @@ class Interface : public QObject {
     std::unique_ptr<MainWindow> m_window;
     std::unique_ptr<ViewController> m_viewController;
     std::unique_ptr<WindowController> m_windowController;
-    QList<QAction*> m_commands; // the window's
+    QList<QAction*> m_commands;    // the window's
+    QPointer<PTZPanel> m_ptzPanel; // the window's; may have been closed
 };
 
 } // namespace qivo

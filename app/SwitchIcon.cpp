@@ -1,18 +1,12 @@
 #include "app/SwitchIcon.h"
 
-#include <QGuiApplication>
-#include <QIconEngine>
+#include "platform/SymbolIcon.h"
+
 #include <QPainter>
 #include <QPainterPath>
-#include <QPalette>
-
-#include <memory>
 
 namespace qivo {
 namespace {
-
-/// The side of the square on which the symbols are drawn.
-constexpr qreal kGrid = 16;
 
 const QColor kRecording(0xd0, 0x2c, 0x2c);
 
@@ -48,51 +42,18 @@ void drawBars(QPainter& painter, const QColor& ink, bool low) {
     }
 }
 
-class SwitchIconEngine : public QIconEngine {
-  public:
-    explicit SwitchIconEngine(SwitchSymbol symbol) : m_symbol(symbol) {}
-
-    void paint(QPainter* painter, const QRect& rect, QIcon::Mode mode, QIcon::State state) override {
-        const auto group = mode == QIcon::Disabled ? QPalette::Disabled : QPalette::Active;
-        const QColor ink = QGuiApplication::palette().color(group, QPalette::ButtonText);
-        const qreal side = qMin(rect.width(), rect.height());
-        painter->save();
-        painter->setRenderHint(QPainter::Antialiasing);
-        painter->translate(rect.center() + QPointF(0.5, 0.5) - QPointF(side / 2, side / 2));
-        painter->scale(side / kGrid, side / kGrid);
-        draw(*painter, ink, state == QIcon::On);
-        painter->restore();
-    }
-
-    QPixmap pixmap(const QSize& size, QIcon::Mode mode, QIcon::State state) override {
-        QPixmap pixmap(size);
-        pixmap.fill(Qt::transparent);
-        QPainter painter(&pixmap);
-        paint(&painter, QRect(QPoint(0, 0), size), mode, state);
-        return pixmap;
-    }
-
-    QIconEngine* clone() const override { return new SwitchIconEngine(*this); } // NOLINT: the caller owns it
-
-  private:
-    void draw(QPainter& painter, const QColor& ink, bool on) const {
-        switch (m_symbol) {
-        case SwitchSymbol::record:
-            return drawRecord(painter, ink, on);
-        case SwitchSymbol::mute:
-            return drawSpeaker(painter, ink, on);
-        case SwitchSymbol::lowBandwidth:
-            return drawBars(painter, ink, on);
-        }
-    }
-
-    SwitchSymbol m_symbol;
-};
-
 } // namespace
 
 QIcon switchIcon(SwitchSymbol symbol) {
-    return QIcon(std::make_unique<SwitchIconEngine>(symbol).release()); // the icon owns its engine
+    switch (symbol) {
+    case SwitchSymbol::record:
+        return symbolIcon(drawRecord);
+    case SwitchSymbol::mute:
+        return symbolIcon(drawSpeaker);
+    case SwitchSymbol::lowBandwidth:
+        return symbolIcon(drawBars);
+    }
+    return {};
 }
 
 } // namespace qivo

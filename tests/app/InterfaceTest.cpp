@@ -5,6 +5,7 @@
 #include "app/WindowController.h"
 #include "platform/Application.h"
 #include "platform/UrlOpener.h"
+#include "ptz/PTZPanel.h"
 #include "tests/app/ShellFixture.h"
 #include "tests/support/Screen.h"
 #include "video/VideoView.h"
@@ -364,6 +365,109 @@ TEST_F(UserTest, ClosingTheWindowWhileReceivingEndsRecordingThenTheReceiver) {
     EXPECT_EQ(receiversWhenRecordingEnded, 1);
     EXPECT_FALSE(model.isRecording());
     EXPECT_EQ(fake.openReceivers(), 0);
+}
+
+/// The panel that steers the camera, opened from the window.
+class PanelTest : public UserTest {
+  protected:
+    void TearDown() override {
+        UserTest::TearDown();
+        model.setPtzSource(nullptr);
+    }
+
+    /// The source tells that it is a camera, and the video view publishes its receiver.
+    void connectToCamera() {
+        fake.setWebControl("http://camera/");
+        fake.setPtzSupported(true);
+        fake.addStatusChange();
+        model.setQIVOSourceInfoNamed("STAGE (Wide)", "fake://wide");
+        ASSERT_TRUE(runUntil([&] { return model.hasPTZControl(); }));
+    }
+
+    void openPanel() {
+        // The keyboard comes back from a panel that has closed.
+        ASSERT_TRUE(runUntil([] { return QApplication::activeWindow() != nullptr; }));
+        ASSERT_TRUE(key("Control+k", [&] { return interface->ptzPanel() && interface->ptzPanel()->isActiveWindow(); }));
+    }
+
+    bool panelIsShown() const { return screen->findWindow("Camera Control").has_value(); }
+};
+
+TEST_F(PanelTest, CommandOpensOnePanelAndBringsItToTheFrontWhenAskedAgain) {
+    EXPECT_EQ(interface->ptzPanel(), nullptr);
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    const QPointer<PTZPanel> panel = interface->ptzPanel();
+    screen->activate(onScreen);
+    ASSERT_TRUE(runUntil([&] { return window().isActiveWindow(); }));
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    EXPECT_EQ(interface->ptzPanel(), panel);
+    const auto titles = screen->titles();
+    EXPECT_EQ(std::count(titles.begin(), titles.end(), "Camera Control"), 1);
+}
+
+TEST_F(PanelTest, PanelThatWasClosedOpensAnew) {
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    const QPointer<PTZPanel> first = interface->ptzPanel();
+    EXPECT_TRUE(key("Escape", [&] { return interface->ptzPanel() == nullptr && first.isNull(); }));
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    interface->ptzPanel()->close();
+    action("actionCameraControl")->trigger(); // before the closed one has gone
+    EXPECT_NE(interface->ptzPanel(), nullptr);
+}
+
+TEST_F(PanelTest, OtherSeguesOpenNothing) {
+    interface->viewController().performSegue("OtherSegue", nullptr);
+    EXPECT_EQ(interface->ptzPanel(), nullptr);
+}
+
+TEST_F(PanelTest, AnotherSourceChosenClosesThePanel) {
+    ASSERT_NO_FATAL_FAILURE(connectToCamera());
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    screen->activate(onScreen);
+    ASSERT_TRUE(runUntil([&] { return window().isActiveWindow(); }));
+    chooseSecondCameraByKeyboard();
+    EXPECT_TRUE(runUntil([&] { return interface->ptzPanel() == nullptr && !panelIsShown(); }));
+}
+
+TEST_F(PanelTest, ClosingTheWindowClosesThePanelOfACamera) {
+    ASSERT_NO_FATAL_FAILURE(connectToCamera());
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    window().close();
+    EXPECT_TRUE(runUntil([&] { return interface->ptzPanel() == nullptr && !panelIsShown(); }));
+}
+
+TEST_F(PanelTest, ClosingTheWindowClosesThePanelWithoutACameraToo) {
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    window().close();
+    EXPECT_TRUE(runUntil([&] { return interface->ptzPanel() == nullptr && !panelIsShown(); }));
+}
+
+TEST_F(PanelTest, KeysOfTheWindowWorkInThePanelAndDoNotClashWithItsOwn) {
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    EXPECT_TRUE(key("Control+m", [&] { return model.mute(); }));
+    EXPECT_TRUE(
+        key("Alt+t", [&] { return interface->ptzPanel()->findChild<QAbstractButton*>("storePreset")->isChecked(); }));
+    EXPECT_TRUE(key("F11", [&] { return window().isFullScreen(); }));
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    EXPECT_TRUE(key("Escape", [&] { return !window().isFullScreen(); }));
+    EXPECT_NE(interface->ptzPanel(), nullptr) << "Escape left the full screen first";
+}
+
+TEST_F(PanelTest, LowBandwidthToggledSteersTheNewReceiverOnceItIsKnown) {
+    ASSERT_NO_FATAL_FAILURE(connectToCamera());
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    const auto first = model.ptzSource();
+    ASSERT_TRUE(key("Control+l", [&] { return model.isLowBandwidth(); }));
+    ASSERT_TRUE(runUntil([&] {
+        return !fake.callsOf("recv_create_v3(name=STAGE (Wide), url=fake://wide, color=2, bandwidth=0").empty();
+    }));
+    EXPECT_EQ(model.ptzSource(), first) << "the library refuses it";
+    EXPECT_NE(interface->ptzPanel(), nullptr);
+    fake.addStatusChange();
+    ASSERT_TRUE(runUntil([&] { return model.ptzSource() != first; }));
+    // The view may have connected before the source was chosen: to what was chosen in an earlier case.
+    const std::string newest = "r" + std::to_string(fake.callsOf("recv_create_v3").size());
+    EXPECT_TRUE(key("5", [&] { return !fake.callsOf("recv_ptz_recall_preset(" + newest + ", 5, 0.25)").empty(); }));
 }
 
 /// Two screens of different scale, side by side.

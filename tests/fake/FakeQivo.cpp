@@ -23,6 +23,7 @@ struct FakeQivo::State {
     std::string web;
     bool ptz = false;
     QIVOlib_recv_queue_t queue{};
+    float focus = 0;
     std::function<void(const std::string&)> hook;
     std::vector<std::string> calls;
     std::vector<std::string> misuse;
@@ -197,6 +198,11 @@ int FakeQivo::stringsOut() const {
 std::vector<std::string> FakeQivo::misuse() const {
     const std::lock_guard guard(m_state->mutex);
     return m_state->misuse;
+}
+
+float FakeQivo::lastFocus() const {
+    const std::lock_guard guard(m_state->mutex);
+    return m_state->focus;
 }
 
 std::vector<const void*> FakeQivo::framesOutData() const {
@@ -431,6 +437,8 @@ bool QIVOlib_recv_ptz_auto_focus(QIVOlib_recv_instance_t p_instance) {
 bool QIVOlib_recv_ptz_focus(QIVOlib_recv_instance_t p_instance, float focus_value) {
     auto& state = fake();
     state.note("recv_ptz_focus(" + state.receiver(p_instance, "recv_ptz_focus") + ", " + number(focus_value) + ")");
+    const std::lock_guard guard(state.mutex);
+    state.focus = focus_value;
     return true;
 }
 

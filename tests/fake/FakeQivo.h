@@ -72,6 +72,8 @@ class FakeQivo {
     int stringsOut() const;
     /// Misuse seen so far; empty if all went by the rules.
     std::vector<std::string> misuse() const;
+    /// The value of the last focus command, whose line is rounded; 0 if there was none.
+    float lastFocus() const;
     /// The `p_data` of captured frames that are still out.
     std::vector<const void*> framesOutData() const;
 

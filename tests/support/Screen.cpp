@@ -245,6 +245,22 @@ bool Screen::key(const std::string& chord) {
     return true;
 }
 
+bool Screen::pressKey(const std::string& name) {
+    const KeyCode code = keyCode(m_display, name);
+    if (code != 0) {
+        XTestFakeKeyEvent(m_display, code, True, CurrentTime);
+        XSync(m_display, False);
+    }
+    return code != 0;
+}
+
+void Screen::releaseKey(const std::string& name) {
+    if (const KeyCode code = keyCode(m_display, name); code != 0) {
+        XTestFakeKeyEvent(m_display, code, False, CurrentTime);
+        XSync(m_display, False);
+    }
+}
+
 void Screen::moveTo(int x, int y) {
     XTestFakeMotionEvent(m_display, DefaultScreen(m_display), x, y, CurrentTime);
     XSync(m_display, False);

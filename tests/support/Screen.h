@@ -69,6 +69,9 @@ class Screen {
 
     /// Presses and releases a chord such as "Alt+s", "Down", "Return", "F11", "Control+q". False for an unknown key.
     bool key(const std::string& chord);
+    /// Presses a key, which repeats as the server's keys do until it is released. False for an unknown key.
+    bool pressKey(const std::string& name);
+    void releaseKey(const std::string& name);
     void moveTo(int x, int y);
     void click(int x, int y);
     void press(int x, int y);
