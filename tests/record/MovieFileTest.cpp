@@ -4,12 +4,12 @@
 #include "tests/record/MovieReader.h"
 #include "tools/record/MovieAtoms.h"
 
+#include <csignal>
 #include <fcntl.h>
 #include <filesystem>
 #include <fstream>
 #include <gtest/gtest.h>
 #include <sys/resource.h>
-#include <csignal>
 
 namespace qivo::record {
 namespace {
@@ -27,9 +27,9 @@ Fragment soundFragment(int number) {
     for (int frame = 0; frame < 800; ++frame) {
         for (int channel = 0; channel < kSound.channels; ++channel) {
             const int value = (number * 800 + frame) * 100;
-            fragment.sound.push_back(static_cast<std::uint8_t>(value));
-            fragment.sound.push_back(static_cast<std::uint8_t>(value >> 8));
             fragment.sound.push_back(static_cast<std::uint8_t>(value >> 16));
+            fragment.sound.push_back(static_cast<std::uint8_t>(value >> 8));
+            fragment.sound.push_back(static_cast<std::uint8_t>(value));
         }
     }
     return fragment;

@@ -51,9 +51,10 @@ class MoviePlaceTest : public testing::Test {
 TEST_F(MoviePlaceTest, NamesAreTakenAsTheyStand) {
     const std::string longest = "LONGNAME (" + std::string(52, 'x') + ")";
     ASSERT_EQ(longest.size(), 63U);
-    for (const std::string& name : {std::string("STUDIO (Cam 1)"), std::string("it's \"quoted\" `here`"),
-                                    std::string("100% %s %n %@"), std::string("Kamera 😀 北"), std::string("a\\b;c&d|e$f*?"),
-                                    std::string("-i"), std::string(" leading and trailing "), longest}) {
+    for (const std::string& name :
+         {std::string("STUDIO (Cam 1)"), std::string("it's \"quoted\" `here`"), std::string("100% %s %n %@"),
+          std::string("Kamera 😀 北"), std::string("a\\b;c&d|e$f*?"), std::string("-i"),
+          std::string(" leading and trailing "), longest}) {
         record(place(name), name);
         EXPECT_EQ(contentOf(m_folder.path(name + ".mov")), name);
     }
@@ -81,8 +82,8 @@ TEST_F(MoviePlaceTest, NoFolderIsMadeBeforeThereIsAMovie) {
 
 TEST_F(MoviePlaceTest, ThePathThatTheNameDoesNotEndNeedsItsFolder) {
     const MoviePlace other("A", m_folder.path("missing/B.mov"));
-    EXPECT_EQ(other.problem(), "cannot record into the folder \"" + m_folder.path("missing") +
-                                   "\": No such file or directory");
+    EXPECT_EQ(other.problem(),
+              "cannot record into the folder \"" + m_folder.path("missing") + "\": No such file or directory");
 }
 
 TEST_F(MoviePlaceTest, AMissingFolderIsToldAndNotMade) {
@@ -107,7 +108,8 @@ TEST_F(MoviePlaceTest, ClimbingOutOfTheFolderIsRefused) {
     for (const std::string name : {"../A", "a/../../A", "a/../b", "../../../../etc/A"}) {
         EXPECT_THAT(place(name).problem(), HasSubstr("lead out")) << name;
     }
-    EXPECT_THAT(MoviePlace("A", m_folder.path() + "/../A.mov").problem(), HasSubstr("\"..\" would lead out of the folder"));
+    EXPECT_THAT(MoviePlace("A", m_folder.path() + "/../A.mov").problem(),
+                HasSubstr("\"..\" would lead out of the folder"));
     EXPECT_THAT(MoviePlace("A", "../A.mov").problem(), HasSubstr("lead out"));
     EXPECT_THAT(MoviePlace("A", m_folder.path() + "/..").problem(), HasSubstr("lead out"));
     EXPECT_EQ(place("A..B").problem(), "") << "dots alone are no climbing";

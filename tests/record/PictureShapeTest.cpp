@@ -1,5 +1,5 @@
-#include "tools/record/EncoderChoice.h"
 #include "tools/record/PictureShape.h"
+#include "tools/record/EncoderChoice.h"
 
 #include <cmath>
 #include <gst/gst.h>

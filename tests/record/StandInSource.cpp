@@ -1,4 +1,5 @@
-// A libqivo with one source, whatever its name, that is made as the variable QIVO_STAND_IN says in words between blanks:
+// A libqivo with one source, whatever its name, that is made as the variable QIVO_STAND_IN says in words between
+// blanks:
 //   picture=WxH@N       pictures of that size, N a second; without it there are none
 //   sound=RxC           sound of that rate and number of channels; without it there is none
 //   resize=MS:WxH       another size from MS milliseconds on
@@ -72,9 +73,10 @@ Script readScript() {
     return script;
 }
 
-/// The moment that all receivers of the process count from.
+/// The moment that all receivers of the process count from: soon after the first is asked for frames, when the others
+/// are as well.
 Clock::time_point beginning() {
-    static const Clock::time_point instance = Clock::now();
+    static const Clock::time_point instance = Clock::now() + milliseconds(100);
     return instance;
 }
 
@@ -109,7 +111,8 @@ struct Receiver {
 };
 
 void Receiver::fillPicture(int width, int height, Clock::time_point due, bool white) {
-    std::vector<std::uint8_t> luma(static_cast<std::size_t>(width) * static_cast<std::size_t>(height), white ? 235 : 60);
+    std::vector<std::uint8_t> luma(static_cast<std::size_t>(width) * static_cast<std::size_t>(height),
+                                   white ? 235 : 60);
     if (script.noise) {
         for (auto& value : luma) {
             value = static_cast<std::uint8_t>(random() >> 8U);
@@ -195,10 +198,6 @@ const QIVOlib_source_t* QIVOlib_find_get_current_sources(QIVOlib_find_instance_t
 QIVOlib_recv_instance_t QIVOlib_recv_create_v3(const QIVOlib_recv_create_v3_t* settings) {
     auto receiver = std::make_unique<Receiver>();
     receiver->sound = settings->bandwidth == QIVOlib_recv_bandwidth_audio_only;
-    // Counted from when the process first connects, and for each receiver from then on.
-    const auto passed = std::chrono::duration_cast<milliseconds>(Clock::now() - beginning()).count();
-    const int rate = receiver->sound ? kBlocksASecond : receiver->script.rate;
-    receiver->number = passed > 100 ? 0 : passed * rate / 1000;
     return reinterpret_cast<QIVOlib_recv_instance_t>(receiver.release());
 }
 void QIVOlib_recv_destroy(QIVOlib_recv_instance_t handle) {
@@ -209,13 +208,13 @@ int32_t QIVOlib_recv_capture_v2(QIVOlib_recv_instance_t handle, QIVOlib_video_fr
     Receiver& receiver = *receiverOf(handle);
     const Clock::time_point limit = Clock::now() + milliseconds(timeout);
     const int rate = receiver.sound ? kBlocksASecond : receiver.script.rate;
-    const bool wanted = receiver.sound ? audio != nullptr && receiver.script.soundRate > 0 : video != nullptr && rate > 0;
+    const bool wanted =
+        receiver.sound ? audio != nullptr && receiver.script.soundRate > 0 : video != nullptr && rate > 0;
     while (wanted) {
         const auto due = beginning() + std::chrono::nanoseconds(receiver.number * std::nano::den / rate);
-        const auto late = milliseconds(
-            receiver.script.jitter > 0 && !receiver.sound
-                ? receiver.random() % static_cast<unsigned>(receiver.script.jitter)
-                : 0);
+        const auto late = milliseconds(receiver.script.jitter > 0 && !receiver.sound
+                                           ? receiver.random() % static_cast<unsigned>(receiver.script.jitter)
+                                           : 0);
         if (due + late > limit) {
             break;
         }
