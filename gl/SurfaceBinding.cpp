@@ -42,7 +42,9 @@ CGLContextObj CGLGetCurrentContext() {
     if (CGLContextObj context = currentOfEgl()) {
         return context;
     }
-    return currentOf("libGL.so.1", "glXGetCurrentContext");
+    // Who links the one need not have loaded the other.
+    CGLContextObj context = currentOf("libGLX.so.0", "glXGetCurrentContext");
+    return context ? context : currentOf("libGL.so.1", "glXGetCurrentContext");
 }
 
 CGLError CGLTexImageIOSurface2D(CGLContextObj context, std::uint32_t target, std::int32_t internal, std::int32_t width,
