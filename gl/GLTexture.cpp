@@ -2,7 +2,9 @@
 
 #include "gl/NSBitmap.h"
 #include "platform/Image.h"
+#include "platform/Log.h"
 #include "platform/Resources.h"
+#include "video/IOSurface2D.h"
 
 #include <epoxy/gl.h>
 
@@ -46,6 +48,18 @@ GLTexture::~GLTexture() {
     }
 }
 
+std::unique_ptr<GLTexture> GLTexture::initWithSurface(IOSurface2D* surface) {
+    auto texture = std::make_unique<GLTexture>(Blank());
+    texture->isFinalized = texture->_initTextureWithSurface(surface);
+    return texture;
+}
+
+std::unique_ptr<GLTexture> GLTexture::initWithSurface(IOSurface2D* surface, CGLContextObj context) {
+    auto texture = std::make_unique<GLTexture>(Blank());
+    texture->isFinalized = texture->_initTextureWithSurface(surface, context);
+    return texture;
+}
+
 std::unique_ptr<GLTexture> GLTexture::initWithImage(const Image* image) {
     auto texture = std::make_unique<GLTexture>(Blank());
     texture->isFinalized = texture->_initTextureWithImage(image);
@@ -81,6 +95,26 @@ void GLTexture::_initProperties() {
     } else {
         _internal = hasAlpha ? GL_RGBA8 : GL_RGB8;
     }
+}
+
+bool GLTexture::_initTextureWithSurface(IOSurface2D* surface, CGLContextObj context) {
+    if (!surface || !context) {
+        return false;
+    }
+    _samplesPerPixel = surface->samplesPerPixel();
+    if (_samplesPerPixel != 3 && _samplesPerPixel != 4) {
+        return false;
+    }
+    _bitsPerComponent = surface->bitsPerComponent();
+    _target = GL_TEXTURE_RECTANGLE;
+    _width = static_cast<std::int32_t>(surface->width());
+    _height = static_cast<std::int32_t>(surface->height());
+    _initProperties();
+    return _newTexture(surface, context);
+}
+
+bool GLTexture::_initTextureWithSurface(IOSurface2D* surface) {
+    return _initTextureWithSurface(surface, CGLGetCurrentContext());
 }
 
 bool GLTexture::_initTextureWithImage(const Image* image) {
@@ -139,6 +173,29 @@ bool GLTexture::_newTexture(const void* pixels) {
     glTexImage2D(_target, 0, _internal, _width, _height, 0, _format, _type, pixels);
     endStorage();
     return _texture != 0;
+}
+
+bool GLTexture::_newTexture(IOSurface2D* surface, CGLContextObj context) {
+    beginStorage();
+    setParameters();
+    const CGLError error =
+        CGLTexImageIOSurface2D(context, _target, _internal, _width, _height, _format, _type, surface->surface(), 0);
+    bool hasStorage = error == kCGLNoError;
+    if (!hasStorage) {
+        logLine(">> MESSAGE[%d]: Fall back scheme for creating a 2d texture from an i/o surface!", error);
+        hasStorage = copySurface(surface);
+    }
+    endStorage();
+    return hasStorage;
+}
+
+bool GLTexture::copySurface(IOSurface2D* surface) const {
+    if (!surface->lock(true)) {
+        return false;
+    }
+    glTexImage2D(_target, 0, _internal, _width, _height, 0, _format, _type, surface->map());
+    surface->unlock();
+    return true;
 }
 
 void GLTexture::setTarget(std::uint32_t target) {

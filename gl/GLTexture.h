@@ -1,5 +1,6 @@
 #pragma once
 
+#include "gl/SurfaceBinding.h"
 #include "platform/Geometry.h"
 
 #include <cstdint>
@@ -7,6 +8,7 @@
 
 namespace qivo {
 
+class IOSurface2D;
 class Image;
 
 /// One GL texture and the description of its storage.
@@ -27,6 +29,18 @@ class GLTexture {
 
     /// Description alone, without a GL call: RGBA, 16 bits, `GL_TEXTURE_2D`, 1920 x 1080.
     GLTexture();
+
+    /// Makes a `GL_TEXTURE_RECTANGLE` texture of a surface of 3 or 4 samples a pixel, for the calling thread's context
+    /// or for a given one, which must be the thread's. Without surface or context there is no GL call.
+    ///
+    /// Where OpenGL can show the surface's memory where it is, the texture does, and follows what is written into it.
+    /// Elsewhere a line of the log says so, and the texture is a copy of the surface as it was, taken while that was
+    /// locked; `update` brings it up to date. If the surface cannot be locked, there is no storage.
+    ///
+    /// The copy is read with the row length that the context has, which is not set here: 0, or the one that a picture
+    /// left behind. One that exceeds the surface's width makes GL read beyond the surface.
+    static std::unique_ptr<GLTexture> initWithSurface(IOSurface2D* surface);
+    static std::unique_ptr<GLTexture> initWithSurface(IOSurface2D* surface, CGLContextObj context);
 
     /// Makes a `GL_TEXTURE_2D` texture of the picture's first bitmap, with one upload. The bitmap must not be planar
     /// and must have 3 or 4 samples; otherwise there is no storage and no GL call. Its samples are taken as R, G, B, A
@@ -95,11 +109,15 @@ class GLTexture {
 
   private:
     void _initProperties();
+    bool _initTextureWithSurface(IOSurface2D* surface, CGLContextObj context);
+    bool _initTextureWithSurface(IOSurface2D* surface);
     bool _initTextureWithImage(const Image* image);
     bool _initTextureWithFile(const char* path);
     bool _initTextureWithURL(const char* url);
     bool _initTextureWithResource(const char* name);
     bool _newTexture(const void* pixels);
+    bool _newTexture(IOSurface2D* surface, CGLContextObj context);
+    bool copySurface(IOSurface2D* surface) const;
     void beginStorage();
     void setParameters() const;
     void endStorage() const;

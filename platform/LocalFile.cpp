@@ -1,5 +1,7 @@
 #include "platform/LocalFile.h"
 
+#include "platform/Descriptor.h"
+
 #include <algorithm>
 #include <cctype>
 #include <cerrno>
@@ -12,23 +14,6 @@
 namespace qivo {
 
 namespace {
-
-class Descriptor {
-  public:
-    explicit Descriptor(int number) : _number(number) {}
-    ~Descriptor() {
-        if (_number >= 0) {
-            ::close(_number);
-        }
-    }
-    Descriptor(const Descriptor&) = delete;
-    Descriptor& operator=(const Descriptor&) = delete;
-
-    int number() const { return _number; }
-
-  private:
-    int _number;
-};
 
 std::string because(const char* path, int number) {
     return std::string(path) + ": " + std::generic_category().message(number);

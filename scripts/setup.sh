@@ -8,11 +8,13 @@ packages_to_build=(
     libgstreamer1.0-dev libgstreamer-plugins-base1.0-dev libgstrtspserver-1.0-dev
     libavahi-core-dev libglib2.0-dev libpango1.0-dev libsoup-3.0-dev libpulse-dev libsdl2-dev libxml2-dev
     libgtest-dev libgmock-dev libbenchmark-dev libx11-dev libxtst-dev libxcb1-dev
+    libpng-dev libtiff-dev libjpeg-dev
 )
 packages_to_run=(
     libgl1-mesa-dri fonts-dejavu-core
     gstreamer1.0-plugins-base gstreamer1.0-plugins-good gstreamer1.0-plugins-bad gstreamer1.0-plugins-ugly
     gstreamer1.0-libav
+    qt6-image-formats-plugins
 )
 # A virtual screen with a window manager, for machines without a display and for tests.
 packages_for_screen=(xvfb openbox x11-utils util-linux iproute2)
