@@ -1,0 +1,154 @@
+#include "tools/record/Fragmenter.h"
+
+#include <algorithm>
+#include <iterator>
+#include <utility>
+
+namespace qivo::record {
+namespace {
+
+constexpr std::int64_t nanosecondsPerSecond = std::nano::den;
+
+std::int64_t unitsIn(Nanoseconds time) {
+    return time.count() / nanosecondsPerSecond * movieTimescale +
+           time.count() % nanosecondsPerSecond * movieTimescale / nanosecondsPerSecond;
+}
+
+} // namespace
+
+void Fragmenter::reach(Nanoseconds time) {
+    m_length = std::max(m_length, time);
+}
+
+void Fragmenter::begin(Nanoseconds origin) {
+    m_origin = origin;
+    for (const SoundPiece& piece : std::exchange(m_early, {})) {
+        placeSound(piece);
+    }
+}
+
+void Fragmenter::addPicture(CodedPicture picture, Nanoseconds now) {
+    if (!m_origin) {
+        begin(picture.time);
+    }
+    const Nanoseconds time = picture.time - *m_origin;
+    MoviePicture placed{std::move(picture.bytes), unitsIn(time), m_usualDuration, picture.key};
+    if (m_pictures.empty()) {
+        placed.start = std::max(placed.start, m_pictureEnd);
+    } else {
+        MoviePicture& last = m_pictures.back();
+        placed.start = std::max(placed.start, last.start + 1);
+        last.duration = static_cast<std::uint32_t>(placed.start - last.start);
+        m_usualDuration = last.duration;
+        placed.duration = last.duration;
+    }
+    reach(time);
+    m_pictures.push_back(std::move(placed));
+    m_lastAdded = now;
+    m_since = m_since.value_or(now);
+}
+
+void Fragmenter::addSound(SoundPiece piece, const SoundFormat& format, Nanoseconds now) {
+    m_format = format;
+    if (!m_placer) {
+        m_placer.emplace(format.rate);
+    }
+    m_since = m_since.value_or(now);
+    if (m_origin) {
+        placeSound(piece);
+    } else {
+        m_early.push_back(std::move(piece));
+    }
+}
+
+void Fragmenter::placeSound(const SoundPiece& piece) {
+    const std::size_t frameBytes = bytesPerSoundFrame(m_format);
+    const auto frames = static_cast<std::int64_t>(piece.bytes.size() / frameBytes);
+    const SoundPlacer::Placed placed = m_placer->place(piece.time - *m_origin, frames);
+    if (!m_placer->begun()) {
+        return;
+    }
+    if (m_sound.empty()) {
+        m_soundStart = m_placer->next() - placed.silence - (placed.repeatFirst ? 1 : 0) - (frames - placed.skip);
+    }
+    m_sound.resize(m_sound.size() + static_cast<std::size_t>(placed.silence) * frameBytes);
+    const auto first = piece.bytes.begin();
+    if (placed.repeatFirst) {
+        m_sound.insert(m_sound.end(), first, first + static_cast<std::ptrdiff_t>(frameBytes));
+    }
+    m_sound.insert(m_sound.end(),
+                   first + static_cast<std::ptrdiff_t>(placed.skip * static_cast<std::int64_t>(frameBytes)),
+                   piece.bytes.end());
+    reach(Nanoseconds(m_placer->next() * nanosecondsPerSecond / m_format.rate));
+}
+
+std::optional<SoundFormat> Fragmenter::soundFormat() const {
+    return m_placer && m_placer->begun() ? std::optional(m_format) : std::nullopt;
+}
+
+/// Sound that has stopped goes on as silence while pictures come.
+void Fragmenter::fillSound() {
+    if (!m_placer || m_pictures.empty()) {
+        return;
+    }
+    const Nanoseconds reached(m_pictures.back().start * nanosecondsPerSecond / movieTimescale);
+    const Nanoseconds heard(m_placer->next() * nanosecondsPerSecond / m_format.rate);
+    if (!m_placer->begun() || reached - heard < soundLate) {
+        return;
+    }
+    if (m_sound.empty()) {
+        m_soundStart = m_placer->next();
+    }
+    const std::int64_t frames = m_placer->fillTo(reached - soundAwaited);
+    m_sound.resize(m_sound.size() + static_cast<std::size_t>(frames) * bytesPerSoundFrame(m_format));
+}
+
+std::optional<Nanoseconds> Fragmenter::due() const {
+    if (!m_since) {
+        return std::nullopt;
+    }
+    return *m_since + (m_origin ? fragmentLength : pictureAwaited);
+}
+
+Fragment Fragmenter::take(Nanoseconds now) {
+    const auto when = due();
+    if (!when || now < *when) {
+        return {};
+    }
+    if (!m_origin) {
+        begin(m_early.front().time);
+    }
+    fillSound();
+    // How long the last picture lasts is known when the next one comes, unless that takes too long.
+    std::size_t pictures = m_pictures.empty() ? 0 : m_pictures.size() - 1;
+    if (!m_pictures.empty() && now - m_lastAdded >= fragmentLength) {
+        m_pictures.back().duration = static_cast<std::uint32_t>(unitsIn(fragmentLength / 2));
+        pictures = m_pictures.size();
+    }
+    Fragment fragment = cut(pictures);
+    m_since = m_pictures.empty() ? std::nullopt : std::optional(m_lastAdded);
+    return fragment;
+}
+
+Fragment Fragmenter::takeAll() {
+    if (!m_origin && !m_early.empty()) {
+        begin(m_early.front().time);
+    }
+    m_since.reset();
+    return cut(m_pictures.size());
+}
+
+Fragment Fragmenter::cut(std::size_t pictures) {
+    Fragment fragment;
+    const auto end = m_pictures.begin() + static_cast<std::ptrdiff_t>(pictures);
+    fragment.pictures.assign(std::make_move_iterator(m_pictures.begin()), std::make_move_iterator(end));
+    m_pictures.erase(m_pictures.begin(), end);
+    if (!fragment.pictures.empty()) {
+        m_pictureEnd = fragment.pictures.back().start + fragment.pictures.back().duration;
+    }
+    fragment.soundStart = m_soundStart;
+    fragment.sound = std::exchange(m_sound, {});
+    return fragment;
+}
+
+} // namespace qivo::record

@@ -1,0 +1,78 @@
+#pragma once
+
+#include "tools/record/MovieFormat.h"
+#include "tools/record/SoundPlacer.h"
+#include "tools/record/SourceClock.h"
+
+#include <deque>
+#include <optional>
+#include <vector>
+
+namespace qivo::record {
+
+/** A coded picture, by this machine's time. */
+struct CodedPicture {
+    std::vector<std::uint8_t> bytes;
+    Nanoseconds time{};
+    bool key = false;
+};
+
+/** A piece of sound in the movie's format, by this machine's time. */
+struct SoundPiece {
+    std::vector<std::uint8_t> bytes;
+    Nanoseconds time{};
+};
+
+/** Puts pictures and sound on the movie's time line and cuts it into fragments.
+ *
+ *  The movie begins with the first picture, and without one soon enough with the first sound. A picture lasts until the
+ *  next one. Time is given by the caller. */
+class Fragmenter {
+  public:
+    /** How much is collected before it is written. What is not written is lost to a power cut, so well below a second.
+     */
+    static constexpr Nanoseconds fragmentLength = std::chrono::milliseconds(400);
+    /** How long sound waits for the first picture. */
+    static constexpr Nanoseconds pictureAwaited = std::chrono::milliseconds(500);
+    /** Sound that is behind the pictures by so much is filled up with silence, and how far. */
+    static constexpr Nanoseconds soundLate = std::chrono::milliseconds(1500);
+    static constexpr Nanoseconds soundAwaited = std::chrono::milliseconds(1000);
+
+    void addPicture(CodedPicture picture, Nanoseconds now);
+    /** The format must be the same each time. */
+    void addSound(SoundPiece piece, const SoundFormat& format, Nanoseconds now);
+
+    /** The next fragment; empty if none is due. */
+    [[nodiscard]] Fragment take(Nanoseconds now);
+    /** All that is left. */
+    [[nodiscard]] Fragment takeAll();
+
+    /** When `take` has something to do by the passing of time alone. */
+    [[nodiscard]] std::optional<Nanoseconds> due() const;
+    /** Of the sound; empty before there is any on the time line. */
+    [[nodiscard]] std::optional<SoundFormat> soundFormat() const;
+    /** Length of the movie so far. */
+    [[nodiscard]] Nanoseconds length() const { return m_length; }
+
+  private:
+    void begin(Nanoseconds origin);
+    void placeSound(const SoundPiece& piece);
+    void fillSound();
+    [[nodiscard]] Fragment cut(std::size_t pictures);
+    void reach(Nanoseconds time);
+
+    std::optional<Nanoseconds> m_origin;
+    std::deque<SoundPiece> m_early; ///< sound before the movie has begun
+    SoundFormat m_format;
+    std::optional<SoundPlacer> m_placer;
+    std::vector<MoviePicture> m_pictures;
+    std::vector<std::uint8_t> m_sound;
+    std::int64_t m_soundStart = 0;
+    std::optional<Nanoseconds> m_since; ///< when the oldest of what waits was added
+    Nanoseconds m_lastAdded{};          ///< when the newest picture was
+    std::int64_t m_pictureEnd = 0;      ///< of what has been cut
+    std::uint32_t m_usualDuration = movieTimescale / 30;
+    Nanoseconds m_length{};
+};
+
+} // namespace qivo::record

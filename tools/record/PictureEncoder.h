@@ -1,0 +1,63 @@
+#pragma once
+
+#include "tools/record/EncoderChoice.h"
+#include "tools/record/Fragmenter.h"
+#include "tools/record/Handles.h"
+#include "tools/record/PictureFitter.h"
+
+#include <gst/app/app.h>
+
+#include <atomic>
+#include <functional>
+#include <memory>
+#include <string>
+
+namespace qivo::record {
+
+/** Encodes received pictures as H.264, all of one shape. Thread: one, apart from `problem`. */
+class PictureEncoder {
+  public:
+    /** Both are called on a thread of the encoder's, in order; they may wait, which holds the encoder up. */
+    struct Calls {
+        std::function<void(PictureFormat)> format; ///< once, before the first picture
+        std::function<void(CodedPicture)> picture;
+    };
+
+    /** Null, with the reason, if this machine has no encoder that works. */
+    [[nodiscard]] static std::unique_ptr<PictureEncoder> create(const PictureShape& shape, Calls calls,
+                                                                std::string& problem);
+    ~PictureEncoder();
+    PictureEncoder(const PictureEncoder&) = delete;
+    PictureEncoder& operator=(const PictureEncoder&) = delete;
+
+    /** Takes a picture that belongs at that time, later than the one before. False if the encoder is so far behind that
+     *  it is left out. The frame can be given back after. */
+    [[nodiscard]] bool encode(const QIVOlib_video_frame_v2_t& frame, Nanoseconds time);
+    /** Waits until all that was taken has been handed on, but not longer than `limit`. Nothing can be encoded after. */
+    void finish(Nanoseconds limit);
+
+    /** The name of the encoder's element. */
+    [[nodiscard]] const std::string& element() const { return m_element; }
+    /** Why encoding has ended; empty if it has not. Thread: any. */
+    [[nodiscard]] std::string problem() const;
+
+  private:
+    struct Callbacks;
+
+    PictureEncoder(const PictureShape& shape, Calls calls);
+    [[nodiscard]] bool start(const EncoderCandidate& encoder);
+    void handOn(GstSample* sample);
+    void handOnFormat(GstSample* sample);
+
+    const PictureShape m_shape;
+    const Calls m_calls;
+    std::string m_element;
+    PictureFitter m_fitter;
+    bool m_formatKnown = false; // appsink's thread only
+    bool m_running = false;
+    Media<GstElement> m_pipeline;
+    Media<GstElement> m_in;
+    Media<GstElement> m_out;
+};
+
+} // namespace qivo::record

@@ -1,0 +1,105 @@
+#include "tools/record/PictureFitter.h"
+
+#include "tools/record/SampleDescription.h"
+
+#include <algorithm>
+
+namespace qivo::record {
+namespace {
+
+constexpr std::uint32_t rgba = 'R' | 'G' << 8 | 'B' << 16 | static_cast<std::uint32_t>('A') << 24;
+constexpr guint opaqueBlack = 0xFF000000U;
+
+GstVideoInfo movieFormat(const PictureShape& shape) {
+    GstVideoInfo info;
+    gst_video_info_set_format(&info, GST_VIDEO_FORMAT_I420, static_cast<guint>(shape.width),
+                              static_cast<guint>(shape.height));
+    gst_video_colorimetry_from_string(&info.colorimetry, isHighDefinition(shape.height) ? GST_VIDEO_COLORIMETRY_BT709
+                                                                                        : GST_VIDEO_COLORIMETRY_BT601);
+    info.chroma_site = GST_VIDEO_CHROMA_SITE_MPEG2;
+    info.par_n = shape.pixelAspectN;
+    info.par_d = shape.pixelAspectD;
+    info.fps_n = shape.rateN;
+    info.fps_d = shape.rateD;
+    return info;
+}
+
+Media<GstBufferPool> poolFor(const GstVideoInfo& info) {
+    const std::size_t size = GST_VIDEO_INFO_SIZE(&info);
+    const auto most = static_cast<guint>(std::max(PictureFitter::fewestPictures, PictureFitter::mostBytes / size));
+    Media<GstBufferPool> pool(gst_buffer_pool_new());
+    const Media<GstCaps> caps(gst_video_info_to_caps(&info));
+    GstStructure* settings = gst_buffer_pool_get_config(pool.get());
+    gst_buffer_pool_config_set_params(settings, caps.get(), static_cast<guint>(size), 0, most);
+    if (!gst_buffer_pool_set_config(pool.get(), settings) || !gst_buffer_pool_set_active(pool.get(), TRUE)) {
+        return nullptr;
+    }
+    return pool;
+}
+
+} // namespace
+
+PictureFitter::PictureFitter(const PictureShape& shape)
+    : m_shape(shape), m_format(movieFormat(shape)), m_pool(poolFor(m_format)) {}
+
+PictureFitter::~PictureFitter() {
+    if (m_pool) {
+        gst_buffer_pool_set_active(m_pool.get(), FALSE);
+    }
+}
+
+/// Makes the converter anew where the frame's form differs from that of the one before.
+bool PictureFitter::prepare(const QIVOlib_video_frame_v2_t& frame) {
+    const Input input{frame.xres, frame.yres, frame.line_stride_in_bytes, areaFor(aspectOf(frame), m_shape)};
+    if (m_converter && input == m_input) {
+        return true;
+    }
+    m_converter.reset();
+    m_input = input;
+    if (!gst_video_info_set_format(&m_inputFormat, GST_VIDEO_FORMAT_RGBA, static_cast<guint>(frame.xres),
+                                   static_cast<guint>(frame.yres))) {
+        return false;
+    }
+    m_inputFormat.fps_n = m_format.fps_n; // the converter refuses others
+    m_inputFormat.fps_d = m_format.fps_d;
+    m_inputFormat.stride[0] = frame.line_stride_in_bytes;
+    m_inputFormat.size = static_cast<gsize>(frame.line_stride_in_bytes) * static_cast<gsize>(frame.yres);
+    GstStructure* settings = gst_structure_new(
+        "settings", GST_VIDEO_CONVERTER_OPT_DEST_X, G_TYPE_INT, input.area.x, GST_VIDEO_CONVERTER_OPT_DEST_Y,
+        G_TYPE_INT, input.area.y, GST_VIDEO_CONVERTER_OPT_DEST_WIDTH, G_TYPE_INT, input.area.width,
+        GST_VIDEO_CONVERTER_OPT_DEST_HEIGHT, G_TYPE_INT, input.area.height, GST_VIDEO_CONVERTER_OPT_FILL_BORDER,
+        G_TYPE_BOOLEAN, TRUE, GST_VIDEO_CONVERTER_OPT_BORDER_ARGB, G_TYPE_UINT, opaqueBlack, nullptr);
+    m_converter.reset(gst_video_converter_new(&m_inputFormat, &m_format, settings));
+    return m_converter != nullptr;
+}
+
+Media<GstBuffer> PictureFitter::fit(const QIVOlib_video_frame_v2_t& frame) {
+    const bool readable = frame.p_data != nullptr && frame.FourCC == rgba && frame.xres > 0 && frame.yres > 0 &&
+                          frame.line_stride_in_bytes / 4 >= frame.xres;
+    if (!readable || !m_pool || !prepare(frame)) {
+        return nullptr;
+    }
+    GstBufferPoolAcquireParams parameters{};
+    parameters.flags = GST_BUFFER_POOL_ACQUIRE_FLAG_DONTWAIT;
+    GstBuffer* taken = nullptr;
+    if (gst_buffer_pool_acquire_buffer(m_pool.get(), &taken, &parameters) != GST_FLOW_OK) {
+        return nullptr;
+    }
+    Media<GstBuffer> picture(taken);
+    const Media<GstBuffer> received(gst_buffer_new_wrapped_full(
+        GST_MEMORY_FLAG_READONLY, frame.p_data, m_inputFormat.size, 0, m_inputFormat.size, nullptr, nullptr));
+    GstVideoFrame in;
+    GstVideoFrame out;
+    if (!gst_video_frame_map(&in, &m_inputFormat, received.get(), GST_MAP_READ)) {
+        return nullptr;
+    }
+    const bool mapped = gst_video_frame_map(&out, &m_format, picture.get(), GST_MAP_WRITE);
+    if (mapped) {
+        gst_video_converter_frame(m_converter.get(), &in, &out);
+        gst_video_frame_unmap(&out);
+    }
+    gst_video_frame_unmap(&in);
+    return mapped ? std::move(picture) : nullptr;
+}
+
+} // namespace qivo::record

@@ -1,0 +1,50 @@
+#pragma once
+
+#include "tools/record/Handles.h"
+#include "tools/record/PictureShape.h"
+
+namespace qivo::record {
+
+/** Brings received pictures into the form in which a movie's pictures are encoded: planes of luma and of halved colour,
+ *  of one size; pictures of another size stand between black bars. Thread: one. */
+class PictureFitter {
+  public:
+    /** Most memory for pictures that are being encoded. */
+    static constexpr std::size_t mostBytes = std::size_t{96} << 20U;
+    static constexpr std::size_t fewestPictures = 6;
+
+    explicit PictureFitter(const PictureShape& shape);
+    ~PictureFitter();
+    PictureFitter(const PictureFitter&) = delete;
+    PictureFitter& operator=(const PictureFitter&) = delete;
+
+    /** The picture in the movie's form; null if as many as may be are still being encoded, or the frame cannot be read.
+     */
+    [[nodiscard]] Media<GstBuffer> fit(const QIVOlib_video_frame_v2_t& frame);
+
+    [[nodiscard]] const GstVideoInfo& format() const { return m_format; }
+    /** False if there is no memory for pictures of this size. */
+    [[nodiscard]] bool ready() const { return m_pool != nullptr; }
+
+  private:
+    /** What a conversion depends on. */
+    struct Input {
+        int width = 0;
+        int height = 0;
+        int stride = 0;
+        PictureArea area;
+
+        friend bool operator==(const Input&, const Input&) = default;
+    };
+
+    [[nodiscard]] bool prepare(const QIVOlib_video_frame_v2_t& frame);
+
+    const PictureShape m_shape;
+    GstVideoInfo m_format{};
+    Media<GstBufferPool> m_pool;
+    Input m_input;
+    GstVideoInfo m_inputFormat{};
+    Media<GstVideoConverter> m_converter;
+};
+
+} // namespace qivo::record

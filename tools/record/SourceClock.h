@@ -1,0 +1,41 @@
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <optional>
+
+namespace qivo::record {
+
+using Nanoseconds = std::chrono::nanoseconds;
+
+/** Puts a stream's frames on this machine's time line by the source's own time stamps.
+ *
+ *  Arrival is when a frame could have been shown, and jitters; the source's stamps do not, but count from nowhere in
+ *  particular, anew with each connection. The distance between the two is followed along its lower edge, the frames
+ * that came with the least delay: at once in the first seconds, then so slowly that the source's spacing is kept. A
+ * stamp that does not fit its arrival by half a second begins anew, as after a break. */
+class SourceClock {
+  public:
+    static constexpr Nanoseconds jump = std::chrono::milliseconds(500);
+    static constexpr Nanoseconds settling = std::chrono::seconds(2);
+    static constexpr std::int64_t slowestEarlier = 1000; ///< 1/n of the time since the last frame
+    static constexpr std::int64_t slowestLater = 10000;
+
+    /** The place of a frame with this stamp that arrived then; later than that of the frame before. */
+    [[nodiscard]] Nanoseconds place(Nanoseconds stamp, Nanoseconds arrival);
+
+  private:
+    void follow(Nanoseconds deviation, Nanoseconds arrival);
+    void begin(Nanoseconds stamp, Nanoseconds arrival);
+
+    struct State {
+        Nanoseconds offset{};  ///< from stamps to places
+        Nanoseconds began{};   ///< the arrival that the offset was first taken from
+        Nanoseconds arrival{}; ///< of the last frame
+        Nanoseconds stamp{};   ///< of the last frame
+        Nanoseconds place{};   ///< of the last frame
+    };
+    std::optional<State> m_state; ///< empty before the first frame
+};
+
+} // namespace qivo::record

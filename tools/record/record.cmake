@@ -1,0 +1,28 @@
+# The recorder. Everything but its main function, so that tests reach the classes; whoever links it brings a libqivo.
+add_library(qivo_record STATIC
+    record/Arguments.cpp
+    record/EncoderChoice.cpp
+    record/Fragmenter.cpp
+    record/MovieAtoms.cpp
+    record/MovieFile.cpp
+    record/MoviePlace.cpp
+    record/MovieWriter.cpp
+    record/PictureEncoder.cpp
+    record/PictureFitter.cpp
+    record/PictureShape.cpp
+    record/Progress.cpp
+    record/Reception.cpp
+    record/Recorder.cpp
+    record/SampleDescription.cpp
+    record/SampleTables.cpp
+    record/SoundFitter.cpp
+    record/SoundPlacer.cpp
+    record/SourceClock.cpp
+    record/Surroundings.cpp
+    record/TrackAtoms.cpp)
+target_link_libraries(qivo_record PUBLIC qivo_interface PkgConfig::GSTREAMER Threads::Threads PRIVATE qivo_options)
+
+add_executable(qivo-record record/main.cpp)
+set_target_properties(qivo-record PROPERTIES OUTPUT_NAME Application.Mac.QIVO.Recording)
+target_link_libraries(qivo-record PRIVATE qivo_record qivo_loader qivo_options)
+install(TARGETS qivo-record RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
