@@ -22,12 +22,11 @@ std::string x264Preset(const PictureShape& shape, unsigned processors) {
 }
 
 std::string x264Properties(const PictureShape& shape, unsigned processors) {
-    // Constant quality. No picture waits for later ones, so that what has been received is soon on the disk; whole
-    // pictures beside each other rather than slices cost one of delay and keep both of two processors busy.
+    // Constant quality. No picture waits for later ones, so that what has been received is soon on the disk: slices are
+    // encoded beside each other, since whole pictures beside each other would hold some back.
     return "speed-preset=" + x264Preset(shape, processors) +
            " pass=qual quantizer=21 bitrate=80000 bframes=0 rc-lookahead=0 sync-lookahead=0 mb-tree=false "
-           "key-int-max=60"
-           " qos=false threads=" +
+           "key-int-max=60 qos=false sliced-threads=true threads=" +
            std::to_string(processors > 2 ? 3 : 2);
 }
 

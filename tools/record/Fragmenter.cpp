@@ -8,6 +8,7 @@ namespace qivo::record {
 namespace {
 
 constexpr std::int64_t nanosecondsPerSecond = std::nano::den;
+constexpr Nanoseconds lateness = std::chrono::milliseconds(100);
 
 std::int64_t unitsIn(Nanoseconds time) {
     return time.count() / nanosecondsPerSecond * movieTimescale +
@@ -20,17 +21,29 @@ void Fragmenter::reach(Nanoseconds time) {
     m_length = std::max(m_length, time);
 }
 
-void Fragmenter::begin(Nanoseconds origin) {
-    m_origin = origin;
-    for (const SoundPiece& piece : std::exchange(m_early, {})) {
-        placeSound(piece);
+/// The first frames of a connection often come late, which only the later ones show: what is held and belongs together
+/// is placed by its end.
+void Fragmenter::straightenSound() {
+    for (std::size_t i = m_held.size(); i-- > 1;) {
+        SoundPiece& piece = m_held[i - 1].piece;
+        const auto frames = static_cast<std::int64_t>(piece.bytes.size() / bytesPerSoundFrame(m_format));
+        const Nanoseconds time = m_held[i].piece.time - Nanoseconds(frames * nanosecondsPerSecond / m_format.rate);
+        if (std::chrono::abs(time - piece.time) < lateness) {
+            piece.time = time;
+        }
+    }
+}
+
+void Fragmenter::placeSoundAddedBefore(Nanoseconds time) {
+    straightenSound();
+    while (!m_held.empty() && m_held.front().added < time) {
+        placeSound(m_held.front().piece);
+        m_held.pop_front();
     }
 }
 
 void Fragmenter::addPicture(CodedPicture picture, Nanoseconds now) {
-    if (!m_origin) {
-        begin(picture.time);
-    }
+    m_origin = m_origin.value_or(picture.time);
     const Nanoseconds time = picture.time - *m_origin;
     MoviePicture placed{std::move(picture.bytes), unitsIn(time), m_usualDuration, picture.key};
     if (m_pictures.empty()) {
@@ -54,11 +67,7 @@ void Fragmenter::addSound(SoundPiece piece, const SoundFormat& format, Nanosecon
         m_placer.emplace(format.rate);
     }
     m_since = m_since.value_or(now);
-    if (m_origin) {
-        placeSound(piece);
-    } else {
-        m_early.push_back(std::move(piece));
-    }
+    m_held.push_back({std::move(piece), now});
 }
 
 void Fragmenter::placeSound(const SoundPiece& piece) {
@@ -116,8 +125,10 @@ Fragment Fragmenter::take(Nanoseconds now) {
         return {};
     }
     if (!m_origin) {
-        begin(m_early.front().time);
+        straightenSound();
+        m_origin = m_held.front().piece.time;
     }
+    placeSoundAddedBefore(now - soundHeld);
     fillSound();
     // How long the last picture lasts is known when the next one comes, unless that takes too long.
     std::size_t pictures = m_pictures.empty() ? 0 : m_pictures.size() - 1;
@@ -126,14 +137,16 @@ Fragment Fragmenter::take(Nanoseconds now) {
         pictures = m_pictures.size();
     }
     Fragment fragment = cut(pictures);
-    m_since = m_pictures.empty() ? std::nullopt : std::optional(m_lastAdded);
+    m_since = m_pictures.empty() && m_held.empty() ? std::nullopt : std::optional(now);
     return fragment;
 }
 
 Fragment Fragmenter::takeAll() {
-    if (!m_origin && !m_early.empty()) {
-        begin(m_early.front().time);
+    if (!m_origin && !m_held.empty()) {
+        straightenSound();
+        m_origin = m_held.front().piece.time;
     }
+    placeSoundAddedBefore(Nanoseconds::max());
     m_since.reset();
     return cut(m_pictures.size());
 }

@@ -34,6 +34,8 @@ class Fragmenter {
     static constexpr Nanoseconds fragmentLength = std::chrono::milliseconds(400);
     /** How long sound waits for the first picture. */
     static constexpr Nanoseconds pictureAwaited = std::chrono::milliseconds(500);
+    /** How long sound waits for better knowledge of where it belongs. */
+    static constexpr Nanoseconds soundHeld = std::chrono::milliseconds(200);
     /** Sound that is behind the pictures by so much is filled up with silence, and how far. */
     static constexpr Nanoseconds soundLate = std::chrono::milliseconds(1500);
     static constexpr Nanoseconds soundAwaited = std::chrono::milliseconds(1000);
@@ -55,14 +57,20 @@ class Fragmenter {
     [[nodiscard]] Nanoseconds length() const { return m_length; }
 
   private:
-    void begin(Nanoseconds origin);
+    struct HeldSound {
+        SoundPiece piece;
+        Nanoseconds added{};
+    };
+
+    void straightenSound();
+    void placeSoundAddedBefore(Nanoseconds time);
     void placeSound(const SoundPiece& piece);
     void fillSound();
     [[nodiscard]] Fragment cut(std::size_t pictures);
     void reach(Nanoseconds time);
 
     std::optional<Nanoseconds> m_origin;
-    std::deque<SoundPiece> m_early; ///< sound before the movie has begun
+    std::deque<HeldSound> m_held; ///< sound that has not been placed
     SoundFormat m_format;
     std::optional<SoundPlacer> m_placer;
     std::vector<MoviePicture> m_pictures;

@@ -17,7 +17,7 @@ struct PictureFormat {
     std::vector<std::uint8_t> decoderSetup; ///< the content of the avcC atom
 };
 
-/** What is the same for all sound of a movie: interleaved signed integers of three bytes, least significant first. */
+/** What is the same for all sound of a movie: interleaved signed integers of three bytes, most significant first. */
 struct SoundFormat {
     int rate = 0; ///< samples a second in each channel
     int channels = 0;

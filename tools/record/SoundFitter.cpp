@@ -35,7 +35,7 @@ bool SoundFitter::prepare(int rate) {
     }
     m_rate = rate;
     GstAudioInfo in = infoOf(GST_AUDIO_FORMAT_F32, rate, m_format.channels, GST_AUDIO_LAYOUT_NON_INTERLEAVED);
-    GstAudioInfo out = infoOf(GST_AUDIO_FORMAT_S24LE, m_format.rate, m_format.channels, GST_AUDIO_LAYOUT_INTERLEAVED);
+    GstAudioInfo out = infoOf(GST_AUDIO_FORMAT_S24BE, m_format.rate, m_format.channels, GST_AUDIO_LAYOUT_INTERLEAVED);
     m_converter.reset(gst_audio_converter_new(GST_AUDIO_CONVERTER_FLAG_NONE, &in, &out, nullptr));
     return m_converter != nullptr;
 }

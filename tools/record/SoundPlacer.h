@@ -14,7 +14,7 @@ class SoundPlacer {
     /** From here on a difference is a gap or an overlap. */
     static constexpr std::chrono::milliseconds gap{20};
     /** From here on a piece of sound is made a sample longer or shorter. */
-    static constexpr std::chrono::milliseconds drift{2};
+    static constexpr std::chrono::milliseconds drift{5};
 
     explicit SoundPlacer(int rate) : m_rate(rate) {}
 

@@ -1,0 +1,45 @@
+// The recorder with the libqivo that ships and a source on the network.
+#include "tests/record/RecorderProcess.h"
+#include "tests/support/Tone.h"
+
+#include <cmath>
+#include <gtest/gtest.h>
+
+namespace qivo::test {
+namespace {
+
+using std::chrono::milliseconds;
+
+TEST(RecorderOnTheNetwork, ThePublishedClockAndToneRunThroughTheMovie) {
+    const auto publisher = Process::start(
+        {PUBLISH, "--loopback-only", "--port", "0", "--machine", "STÜDIO 😀", "--source", "Cam 1", "--size", "640x360"});
+    ASSERT_TRUE(publisher && publisher->waitForOutput("(Cam 1)"));
+    RecorderProcess recorder("", "STÜDIO 😀 (Cam 1)", "exec \"$@\"", "");
+    ASSERT_TRUE(recorder.waitForLength(milliseconds(2500))) << recorder.process().errors();
+    EXPECT_EQ(recorder.interrupt(), 0) << recorder.process().errors();
+    EXPECT_LT(recorder.ending(), milliseconds(1000));
+    const DecodedMovie movie = recorder.movie();
+    ASSERT_TRUE(movie.readable) << movie.error;
+    EXPECT_EQ(movie.width, 640);
+    EXPECT_EQ(movie.height, 360);
+    ASSERT_GE(movie.pictures.size(), 30U);
+    const auto& middle = movie.pictures[movie.pictures.size() / 2];
+    std::int64_t last = 0;
+    for (const auto& picture : movie.pictures) {
+        ASSERT_TRUE(picture.published && middle.published) << picture.time;
+        EXPECT_GT(*picture.published, last);
+        last = *picture.published;
+        EXPECT_NEAR(picture.time - middle.time, static_cast<double>(*picture.published - *middle.published) * 1e-3,
+                    0.040);
+    }
+    EXPECT_LT(movie.soundJump, 0.001);
+    EXPECT_NEAR(movie.soundEnd(), movie.pictures.back().time, 0.3);
+    // Its first channel, without a break once the first packets have come. Where the machine is busy single samples are
+    // left out to keep it in place, which makes a step twice as high.
+    const std::vector<float> tone(movie.sound.end() - movie.rate, movie.sound.end());
+    EXPECT_NEAR(frequencyOf(tone, movie.rate), 440, 1);
+    EXPECT_LT(largestStep(tone), 2 * std::sin(M_PI * 440 / movie.rate) * 0.1 * 2.2);
+}
+
+} // namespace
+} // namespace qivo::test
