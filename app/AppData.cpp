@@ -1,11 +1,14 @@
 #include "app/AppData.h"
 
 #include "platform/Application.h"
+#include "platform/Task.h"
 
 #include <QCoreApplication>
 #include <QDir>
 #include <QFileInfo>
 
+#include <chrono>
+#include <thread>
 #include <utility>
 
 namespace qivo {
@@ -45,7 +48,9 @@ AppData::AppData(std::unique_ptr<Preferences> preferences) : m_preferences(std::
     }
 }
 
-AppData::~AppData() = default;
+AppData::~AppData() {
+    stopRecording();
+}
 
 void AppData::serialize() {
     m_preferences->setBool(isLowBandwidth(), QLatin1String(kLowBandwidthKey));
@@ -114,8 +119,54 @@ void AppData::setRecordingFolder(const QString& recordingFolder) {
 }
 
 void AppData::setIsRecording(bool isRecording) {
-    m_isRecording = isRecording;
+    if (m_isRecording != isRecording) {
+        m_isRecording = isRecording;
+        if (isRecording) {
+            startRecording();
+        } else {
+            stopRecording();
+        }
+    }
     emit isRecordingChanged();
+}
+
+void AppData::startRecording() {
+    stopRecording();
+    if (m_selectedQIVOSourceName.isEmpty() || m_recordingFolder.isEmpty()) {
+        return;
+    }
+    m_recordingThread = std::make_unique<CancellableThread>(
+        [this, sourceAndFolder = QStringList{m_selectedQIVOSourceName, m_recordingFolder}](
+            const std::stop_token& cancelled) { recordThreadProc(sourceAndFolder, cancelled); });
+}
+
+void AppData::stopRecording() {
+    if (!m_recordingThread) {
+        return;
+    }
+    m_recordingThread->cancel();
+    while (m_recordingThread->isExecuting()) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(kRecordingPollMs));
+    }
+    m_recordingThread.reset();
+}
+
+void AppData::recordThreadProc(const QStringList& sourceAndFolder, const std::stop_token& cancelled) const {
+    const QString& source = sourceAndFolder.at(0);
+    const QString movie = sourceAndFolder.at(1) + QLatin1Char('/') + source + QLatin1String(".mov");
+    const auto recorder = Task::launch(m_recorderPath.toStdString(), {"-i", source.toStdString(), "-o",
+                                                                      movie.toStdString(), "-orvane", "-nothumbnail"});
+    while (recorder && recorder->isRunning()) {
+        // What it says is for people who run it by hand; here it only has to be taken.
+        const bool outputHasEnded = recorder->readOutput().empty();
+        if (cancelled.stop_requested()) {
+            recorder->interrupt();
+        }
+        if (outputHasEnded) {
+            // Nothing holds the next pass up any more, and it would come at once.
+            std::this_thread::sleep_for(std::chrono::milliseconds(kRecordingPollMs));
+        }
+    }
 }
 
 } // namespace qivo

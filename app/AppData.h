@@ -1,15 +1,18 @@
 #pragma once
 
+#include "platform/CancellableThread.h"
 #include "platform/Preferences.h"
 #include "sdk/qivo.h"
 
 #include <QObject>
 #include <QString>
+#include <QStringList>
 
 #include <atomic>
 #include <cstdint>
 #include <memory>
 #include <mutex>
+#include <stop_token>
 
 Q_DECLARE_OPAQUE_POINTER(QIVOlib_recv_instance_t)
 
@@ -45,6 +48,11 @@ class AppData : public QObject {
     static constexpr const char* kLowBandwidthKey = "ORVQIVOViewer_isLowBandwith"; // spelled as settings were saved
     static constexpr const char* kMuteKey = "ORVQIVOViewer_mute";
     static constexpr const char* kRecordFolderKey = "ORVQIVOViewer_recordFolder";
+
+    /// The program that records.
+    static constexpr const char* kRecorderPath = "/usr/local/bin/Application.Mac.QIVO.Recording";
+    /// How often `stopRecording` looks whether the recorder has ended, in milliseconds.
+    static constexpr int kRecordingPollMs = 5;
 
     /// The shared model, made by the first call and never destroyed. Safe from any thread. It belongs to the main
     /// thread if an application object exists by then.
@@ -100,9 +108,27 @@ class AppData : public QObject {
     QString recordingFolder() const { return m_recordingFolder; }
     void setRecordingFolder(const QString& recordingFolder);
 
-    /// A recording is wanted.
+    /// A recording is wanted. A change starts or stops the recorder before it is announced. That the recorder runs is
+    /// not said: it may have ended by itself, or never have begun for lack of a source, a folder or the program.
     bool isRecording() const { return m_isRecording; }
     void setIsRecording(bool isRecording);
+
+    /// Starts the recorder for the selected source, after having stopped the one that runs. Without a source or a
+    /// folder nothing starts. Name and folder are copied: what changes later does not touch this recording.
+    void startRecording();
+
+    /// Tells the recorder to end and waits until it has, which is up to the recorder: it is interrupted each time that
+    /// it has written to its standard output, until it exits. Returns at once if none runs.
+    void stopRecording();
+
+    /// The recording thread: runs the recorder for a source (the first of the two) into a folder (the second), until
+    /// the recorder exits. A recorder that cannot be launched ends it at once, without a word.
+    ///
+    /// Thread: any; nothing of the model is changed or read but the recorder's path.
+    void recordThreadProc(const QStringList& sourceAndFolder, const std::stop_token& cancelled) const;
+
+    /// Has another program record in the place of the installed one. For tests; not while a recorder runs.
+    void setRecorderPath(const QString& path) { m_recorderPath = path; }
 
   signals:
     void isLowBandwidthChanged();
@@ -130,6 +156,8 @@ class AppData : public QObject {
     std::unique_ptr<Preferences> m_preferences;
     QString m_recordingFolder;
     bool m_isRecording = false;
+    QString m_recorderPath = QString::fromLatin1(kRecorderPath); // read by the recording thread while there is one
+    std::unique_ptr<CancellableThread> m_recordingThread;
 };
 
 } // namespace qivo

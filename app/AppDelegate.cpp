@@ -134,6 +134,36 @@ void AppDelegate::showPTZControl() {
 
 void AppDelegate::handleSettingsMenuClick() {}
 
+void AppDelegate::setRecordPath() {
+    if (m_recordPathPanel) {
+        m_recordPathPanel->raise();
+        m_recordPathPanel->activateWindow();
+        return;
+    }
+    m_recordPathPanel = makeRecordPathPanel().release(); // deletes itself when it has been closed
+    connect(m_recordPathPanel, &QFileDialog::finished, this, [this, panel = m_recordPathPanel.data()](int response) {
+        if (response == QDialog::Accepted) {
+            takeRecordPath(panel->selectedFiles());
+        }
+    });
+    m_recordPathPanel->open();
+}
+
+std::unique_ptr<QFileDialog> AppDelegate::makeRecordPathPanel() const {
+    auto panel = std::make_unique<QFileDialog>(mainWindow(), QString::fromLatin1(kRecordPathMessage),
+                                               m_theModel->recordingFolder());
+    panel->setFileMode(QFileDialog::Directory);
+    panel->setOption(QFileDialog::ShowDirsOnly);
+    panel->setAttribute(Qt::WA_DeleteOnClose);
+    return panel;
+}
+
+void AppDelegate::takeRecordPath(const QStringList& chosen) {
+    if (!chosen.isEmpty() && !chosen.first().isEmpty()) {
+        m_theModel->setRecordingFolder(chosen.first());
+    }
+}
+
 bool AppDelegate::validateMenuItem(const QAction* item) const {
     return item->data().toInt() != kDeviceWebpageTag || m_theModel->hasDeviceWebpage();
 }

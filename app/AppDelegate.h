@@ -6,6 +6,7 @@
 #include "platform/Activity.h"
 
 #include <QAction>
+#include <QFileDialog>
 #include <QObject>
 #include <QPointer>
 
@@ -25,6 +26,7 @@ class AppDelegate : public QObject {
     /// The tag of commands that need the connected source's web page.
     static constexpr int kDeviceWebpageTag = -1;
     static constexpr const char* kActivityReason = "realtime UDP receiving";
+    static constexpr const char* kRecordPathMessage = "Choose the directory for recordings.";
 
     AppDelegate();
     ~AppDelegate() override;
@@ -52,6 +54,10 @@ class AppDelegate : public QObject {
     void showPTZControl();
     void handleSettingsMenuClick();
 
+    /// Has the user choose the folder for recordings, in a panel that belongs to the main window, if there is one. It
+    /// returns at once; the model learns of the folder when the user has chosen. A panel that is open comes forward.
+    void setRecordPath();
+
     /// Whether a command of the menu is to be enabled.
     bool validateMenuItem(const QAction* item) const;
 
@@ -60,11 +66,14 @@ class AppDelegate : public QObject {
 
   private:
     void bindAudioPlayer();
+    std::unique_ptr<QFileDialog> makeRecordPathPanel() const;
+    void takeRecordPath(const QStringList& chosen);
 
     AppData* m_theModel;
     std::unique_ptr<AudioPlayback> m_audioPlayer;
     std::unique_ptr<Activity> m_noAppNapActivity;
     QPointer<QIVOFileMenu> m_qivoSourcesMenu;
+    QPointer<QFileDialog> m_recordPathPanel; // while it is open
 };
 
 } // namespace qivo

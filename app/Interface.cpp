@@ -45,6 +45,7 @@ void Interface::loadMenus() {
     addCommand(m_ui->actionSettings, &AppDelegate::handleSettingsMenuClick);
     addCommand(m_ui->actionWebControlPage, &AppDelegate::gotoDeviceWebpage);
     addCommand(m_ui->actionCameraControl, &AppDelegate::showPTZControl);
+    addCommand(m_ui->actionRecordingFolder, &AppDelegate::setRecordPath);
     connect(m_ui->actionQuit, &QAction::triggered, qApp, &QApplication::quit, Qt::QueuedConnection);
     connect(m_ui->actionFullScreen, &QAction::triggered, m_window.get(), &MainWindow::setFullScreen);
     connect(m_ui->actionLeaveFullScreen, &QAction::triggered, m_window.get(),

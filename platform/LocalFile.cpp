@@ -1,6 +1,6 @@
 #include "platform/LocalFile.h"
 
-#include "platform/Descriptor.h"
+#include "platform/FileDescriptor.h"
 
 #include <algorithm>
 #include <cctype>
@@ -20,9 +20,9 @@ std::string because(const char* path, int number) {
 }
 
 /// Why this is not a regular file that could be read whole; empty if it is one.
-std::string objection(const char* path, const Descriptor& file) {
+std::string objection(const char* path, const FileDescriptor& file) {
     struct stat status {};
-    if (file.number() < 0 || ::fstat(file.number(), &status) != 0) {
+    if (!file.isOpen() || ::fstat(file.number(), &status) != 0) {
         return because(path, errno);
     }
     if (S_ISDIR(status.st_mode)) {
@@ -32,7 +32,7 @@ std::string objection(const char* path, const Descriptor& file) {
 }
 
 /// Reads up to `maximumBytes` and one more, by which a file that is too large is told; false on an error, in errno.
-bool readUpTo(std::size_t maximumBytes, const Descriptor& file, std::string& bytes) {
+bool readUpTo(std::size_t maximumBytes, const FileDescriptor& file, std::string& bytes) {
     char chunk[16384];
     while (bytes.size() <= maximumBytes) {
         const auto wanted = std::min(sizeof chunk, maximumBytes + 1 - bytes.size());
@@ -91,7 +91,7 @@ std::optional<std::string> readFile(const char* path, std::size_t maximumBytes, 
         return std::nullopt;
     }
     // Opening a pipe that nobody writes to would wait for ever otherwise.
-    const Descriptor file(::open(path, O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+    const FileDescriptor file(::open(path, O_RDONLY | O_CLOEXEC | O_NONBLOCK));
     error = objection(path, file);
     if (!error.empty()) {
         return std::nullopt;

@@ -27,7 +27,11 @@ class AppDataTest : public testing::Test {
         ASSERT_EQ(QDir::homePath().toStdString(), home.path());
     }
 
-    std::unique_ptr<AppData> make() const { return std::make_unique<AppData>(store()); }
+    std::unique_ptr<AppData> make() const {
+        auto model = std::make_unique<AppData>(store());
+        model->setRecorderPath(QString()); // not the one that this machine may have
+        return model;
+    }
 
     std::unique_ptr<Preferences> store() const {
         return std::make_unique<Preferences>(QString::fromStdString(directory.path("app.conf")));

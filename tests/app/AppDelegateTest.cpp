@@ -6,12 +6,17 @@
 #include "platform/Preferences.h"
 #include "platform/Resources.h"
 #include "platform/UrlOpener.h"
+#include "tests/app/RecorderScript.h"
 #include "tests/app/ShellFixture.h"
 #include "tests/audio/FakeAudioQueue.h"
 #include "tests/platform/LogCapture.h"
 
+#include <QDialogButtonBox>
 #include <QFile>
+#include <QFileDialog>
 #include <QFileInfo>
+#include <QLineEdit>
+#include <QPushButton>
 #include <QSignalSpy>
 
 #include <vector>
@@ -103,6 +108,35 @@ TEST_F(AppDelegateTest, TerminationEndsTheFinderThenTheRecordingAndSavesTheSetti
     EXPECT_THAT(order, ElementsAre("find_destroy(f1)", "recording ended"));
     EXPECT_EQ(Preferences(file).boolForKey(AppData::kMuteKey), true);
     fake.setHook({});
+}
+
+TEST_F(AppDelegateTest, TerminationWaitsForTheRecorderAfterTheFinderAndBeforeTheSettingsAreSaved) {
+    const QString file = Preferences::userFile();
+    QFile::remove(file);
+    const test::RecorderScript script;
+    model.setRecorderPath(QString::fromStdString(script.program("chatty")));
+    AppDelegate delegate;
+    QIVOFileMenu menu;
+    delegate.setQivoSourcesMenu(&menu);
+    delegate.applicationDidFinishLaunching();
+    model.setQIVOSourceInfoNamed("STUDIO (Cam 1)", "fake://1");
+    model.setIsRecording(true);
+    ASSERT_TRUE(script.waitForStarts(1));
+    std::vector<int> ends;
+    fake.setHook([&](const std::string& call) {
+        if (call == "find_destroy(f1)") {
+            ends.push_back(script.ends());
+        }
+    });
+    QObject context;
+    QObject::connect(&model, &AppData::isRecordingChanged, &context, [&] {
+        ends.push_back(script.ends());
+        EXPECT_FALSE(QFileInfo::exists(file)) << "settings are saved after the recorder has stopped";
+    });
+    delegate.applicationWillTerminate();
+    fake.setHook({});
+    EXPECT_THAT(ends, ElementsAre(0, 1));
+    EXPECT_TRUE(QFileInfo::exists(file));
 }
 
 TEST_F(AppDelegateTest, TerminationWithoutLaunchAndWithoutMenuIsHarmless) {
@@ -309,6 +343,133 @@ TEST_F(AppDelegateTest, SettingsCommandDoesNothing) {
     const auto windows = QApplication::topLevelWidgets().size();
     EXPECT_EQ(printed([&] { delegate.handleSettingsMenuClick(); }), "");
     EXPECT_EQ(QApplication::topLevelWidgets().size(), windows);
+}
+
+/// The panel in which the user chooses the folder for recordings.
+class RecordPathTest : public AppDelegateTest {
+  protected:
+    void SetUp() override {
+        AppDelegateTest::SetUp();
+        model.setRecordingFolder(QString::fromStdString(folder.path()));
+        std::filesystem::create_directory(folder.path("takes"));
+        folder.write("plain", "no folder");
+    }
+
+    void TearDown() override {
+        delete panel();
+        AppDelegateTest::TearDown();
+    }
+
+    QFileDialog* open() {
+        delegate.setRecordPath();
+        return panel();
+    }
+
+    static QFileDialog* panel() {
+        for (QWidget* widget : QApplication::topLevelWidgets()) {
+            if (auto* found = qobject_cast<QFileDialog*>(widget)) {
+                return found;
+            }
+        }
+        return nullptr;
+    }
+
+    /// Goes to a directory and presses the button that accepts it.
+    static void answer(QFileDialog* panel, const std::string& path) {
+        panel->setDirectory(QString::fromStdString(path));
+        panel->findChild<QLineEdit*>()->clear();
+        for (QAbstractButton* button : panel->findChild<QDialogButtonBox*>()->buttons()) {
+            if (panel->findChild<QDialogButtonBox*>()->buttonRole(button) == QDialogButtonBox::AcceptRole) {
+                button->click();
+            }
+        }
+    }
+
+    static bool isClosed() {
+        return test::runUntil([] { return panel() == nullptr; });
+    }
+
+    TemporaryDirectory folder;
+    AppDelegate delegate;
+};
+
+TEST_F(RecordPathTest, PanelIsASheetOfTheMainWindowForDirectoriesOnly) {
+    MainWindow window;
+    setMainWindow(&window);
+    window.show();
+    const QFileDialog* sheet = open();
+    ASSERT_NE(sheet, nullptr);
+    EXPECT_TRUE(sheet->isVisible()) << "the command does not wait for the answer";
+    EXPECT_EQ(sheet->parentWidget(), &window);
+    EXPECT_EQ(sheet->windowModality(), Qt::WindowModal);
+    EXPECT_EQ(sheet->windowTitle(), "Choose the directory for recordings.");
+    EXPECT_EQ(sheet->fileMode(), QFileDialog::Directory);
+    EXPECT_TRUE(sheet->testOption(QFileDialog::ShowDirsOnly));
+    EXPECT_EQ(sheet->acceptMode(), QFileDialog::AcceptOpen);
+    EXPECT_EQ(sheet->directory().path().toStdString(), folder.path());
+    delete panel();
+}
+
+TEST_F(RecordPathTest, ChosenDirectoryBecomesTheFolderForRecordings) {
+    QSignalSpy changes(&model, &AppData::recordingFolderChanged);
+    answer(open(), folder.path("takes"));
+    EXPECT_TRUE(isClosed());
+    EXPECT_EQ(model.recordingFolder().toStdString(), folder.path("takes"));
+    EXPECT_EQ(changes.count(), 1);
+}
+
+TEST_F(RecordPathTest, DirectoryOfAnyNameIsTakenAsItIs) {
+    for (const std::string name : {"two  blanks", "100 % \"quoted\" (it's)", "\xf0\x9f\x8e\xa5 ä"}) {
+        std::filesystem::create_directory(folder.path(name));
+        answer(open(), folder.path(name));
+        EXPECT_TRUE(isClosed());
+        EXPECT_EQ(model.recordingFolder().toStdString(), folder.path(name));
+    }
+}
+
+TEST_F(RecordPathTest, CancellingThePanelLeavesTheFolder) {
+    QSignalSpy changes(&model, &AppData::recordingFolderChanged);
+    open()->reject();
+    EXPECT_TRUE(isClosed());
+    open()->close();
+    EXPECT_TRUE(isClosed());
+    EXPECT_EQ(model.recordingFolder().toStdString(), folder.path());
+    EXPECT_EQ(changes.count(), 0);
+}
+
+TEST_F(RecordPathTest, FolderThatHasGoneDoesNotKeepThePanelFromOpening) {
+    model.setRecordingFolder(QString::fromStdString(folder.path("gone")));
+    answer(open(), folder.path("takes"));
+    EXPECT_TRUE(isClosed());
+    EXPECT_EQ(model.recordingFolder().toStdString(), folder.path("takes"));
+}
+
+TEST_F(RecordPathTest, WithoutMainWindowThePanelStandsAlone) {
+    setMainWindow(nullptr);
+    const QFileDialog* alone = open();
+    ASSERT_NE(alone, nullptr);
+    EXPECT_TRUE(alone->isVisible());
+    EXPECT_EQ(alone->parentWidget(), nullptr);
+    answer(panel(), folder.path("takes"));
+    EXPECT_TRUE(isClosed());
+    EXPECT_EQ(model.recordingFolder().toStdString(), folder.path("takes"));
+}
+
+TEST_F(RecordPathTest, OpenPanelIsNotOpenedTwice) {
+    const QFileDialog* first = open();
+    const auto windows = QApplication::topLevelWidgets().size();
+    EXPECT_EQ(open(), first);
+    EXPECT_EQ(QApplication::topLevelWidgets().size(), windows);
+}
+
+TEST_F(RecordPathTest, WindowThatGoesTakesItsPanelAlong) {
+    auto window = std::make_unique<MainWindow>();
+    setMainWindow(window.get());
+    window->show();
+    open();
+    window.reset();
+    EXPECT_EQ(panel(), nullptr);
+    EXPECT_NE(open(), nullptr) << "a new one";
 }
 
 } // namespace

@@ -11,6 +11,7 @@
 #include "video/VideoView.h"
 
 #include <QAccessible>
+#include <QFileDialog>
 #include <QMenuBar>
 #include <QProcess>
 #include <QScreen>
@@ -99,10 +100,14 @@ TEST_F(InterfaceTest, OnlyTheWebControlPageHasTheTagOfThePage) {
     }
 }
 
-TEST_F(InterfaceTest, RecordingFolderCannotBeChosenWhileNothingAnswersTheCommand) {
-    EXPECT_FALSE(action("actionRecordingFolder")->isEnabled());
-    model.setDeviceWebpageURL("http://camera/");
-    EXPECT_FALSE(action("actionRecordingFolder")->isEnabled());
+TEST_F(InterfaceTest, RecordingFolderCanAlwaysBeChosen) {
+    EXPECT_TRUE(action("actionRecordingFolder")->isEnabled());
+    model.setDeviceWebpageURL("");
+    EXPECT_TRUE(action("actionRecordingFolder")->isEnabled());
+    action("actionRecordingFolder")->trigger();
+    const auto* panel = window().findChild<QFileDialog*>();
+    ASSERT_NE(panel, nullptr);
+    EXPECT_EQ(panel->windowTitle(), AppDelegate::kRecordPathMessage);
 }
 
 TEST_F(InterfaceTest, ShortcutsAndMenuKeysDoNotClash) {

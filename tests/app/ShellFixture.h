@@ -43,6 +43,7 @@ class ShellFixture : public testing::Test {
         fake.reset();
         model.setDeviceWebpageURL(QString());
         model.setIsRecording(false);
+        model.setRecorderPath(QString()); // not the one that this machine may have
         model.setMute(false);
         model.setIsLowBandwidth(false);
     }

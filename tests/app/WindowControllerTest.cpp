@@ -1,6 +1,7 @@
 #include "app/WindowController.h"
 
 #include "app/MainWindow.h"
+#include "tests/app/RecorderScript.h"
 #include "tests/app/ShellFixture.h"
 
 #include <QMenuBar>
@@ -50,6 +51,19 @@ TEST_F(WindowControllerTest, ClosingTheWindowEndsTheRecordingBeforeAnybodyElseHe
     EXPECT_EQ(willClose.count(), 1);
     EXPECT_FALSE(recordingWhenOthersHear);
     EXPECT_FALSE(model.isRecording());
+}
+
+TEST_F(WindowControllerTest, ClosingTheWindowWhileRecordingInterruptsTheRecorderAndWaitsForIt) {
+    const test::RecorderScript script;
+    model.setRecorderPath(QString::fromStdString(script.program("chatty")));
+    model.setQIVOSourceInfoNamed("STUDIO (Cam 1)", "fake://1");
+    model.setIsRecording(true);
+    ASSERT_TRUE(script.waitForStarts(1));
+    int endsWhenOthersHear = -1;
+    QObject::connect(&window, &MainWindow::willClose, &window, [&] { endsWhenOthersHear = script.ends(); });
+    window.show();
+    EXPECT_TRUE(window.close());
+    EXPECT_EQ(endsWhenOthersHear, 1);
 }
 
 TEST_F(WindowControllerTest, AnswersTheSharedModel) {

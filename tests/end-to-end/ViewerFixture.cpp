@@ -2,6 +2,7 @@
 
 #include "tools/publish/TimeCode.h"
 
+#include <algorithm>
 #include <array>
 #include <cmath>
 #include <cstdlib>
@@ -13,6 +14,9 @@ namespace qivo::test {
 namespace {
 
 constexpr int kSwitchesWidth = 90;                            // pixels at the right end of the menu bar
+constexpr int kRecordSwitchMiddle = 21;                       // pixels from their left
+constexpr int kRecordSwitchRing = 10;                         // pixels across, at the least; the disc is smaller
+constexpr int kRed = 80;                                      // of 255: more than this above the other colours
 constexpr auto kPressedLook = std::chrono::milliseconds(150); // longer than a switch looks pressed before it turns
 constexpr int kColourTolerance = 14; // of 255: what two colour conversions and a lossy coder may do to a flat area
 
@@ -97,17 +101,44 @@ void ViewerTest::choose(int machine, int source, const std::string& name) {
 }
 
 void ViewerTest::pressSwitch(const std::string& chord) {
-    const Window inside = view();
-    const int height = inside.y - window()->y;
-    const Window switches{0, inside.x + inside.width - kSwitchesWidth, inside.y - height, kSwitchesWidth, height};
-    const Picture before = m_screen->grab(switches);
-    m_screen->key(chord);
+    turnSwitch([&] { m_screen->key(chord); });
+}
+
+void ViewerTest::clickRecordSwitch() {
+    const Window all = switches();
+    turnSwitch([&] { m_screen->click(all.x + kRecordSwitchMiddle, all.y + all.height / 2); });
+}
+
+void ViewerTest::turnSwitch(const std::function<void()>& turn) {
+    const Picture before = m_screen->grab(switches());
+    turn();
     Picture last = before;
     EXPECT_TRUE(eventually([&] {
         std::this_thread::sleep_for(kPressedLook);
-        const Picture earlier = std::exchange(last, m_screen->grab(switches));
+        const Picture earlier = std::exchange(last, m_screen->grab(switches()));
         return last.pixels != before.pixels && last.pixels == earlier.pixels;
-    })) << chord;
+    })) << "the switch looks as before";
+}
+
+Window ViewerTest::switches() const {
+    const Window inside = view();
+    const int height = inside.y - window()->y;
+    return {0, inside.x + inside.width - kSwitchesWidth, inside.y - height, kSwitchesWidth, height};
+}
+
+bool ViewerTest::recordSwitchShowsOn() const {
+    const Picture look = m_screen->grab(switches());
+    // The ring round the disc is red only while it is on.
+    int left = look.width;
+    int right = 0;
+    for (int x = 0; x < look.width; ++x) {
+        const auto colour = look.at(x, look.height / 2);
+        if (colour.red > colour.green + kRed && colour.red > colour.blue + kRed) {
+            left = std::min(left, x);
+            right = std::max(right, x);
+        }
+    }
+    return right - left >= kRecordSwitchRing;
 }
 
 std::optional<Window> ViewerTest::window() const {

@@ -4,6 +4,7 @@
 #include "tests/support/Screen.h"
 
 #include <cstdint>
+#include <functional>
 #include <gtest/gtest.h>
 #include <memory>
 #include <optional>
@@ -41,6 +42,10 @@ class ViewerTest : public testing::Test {
     /// Presses a switch's shortcut and waits until the switches at the end of the menu bar look different and stay so:
     /// a switch looks pressed for a moment before it turns.
     void pressSwitch(const std::string& chord);
+    /// Clicks the record switch with the mouse, and waits likewise.
+    void clickRecordSwitch();
+    /// Whether the record switch looks on.
+    bool recordSwitchShowsOn() const;
 
     std::optional<Window> window() const;
     /// The picture's own window inside the main window.
@@ -58,6 +63,11 @@ class ViewerTest : public testing::Test {
     std::unique_ptr<Screen> m_screen;
     std::unique_ptr<Process> m_viewer;
     std::string m_title = "QIVO Viewer";
+
+  private:
+    void turnSwitch(const std::function<void()>& turn);
+    /// The place of the switches at the right end of the menu bar.
+    Window switches() const;
 };
 
 } // namespace qivo::test
