@@ -1,6 +1,5 @@
 #include "tests/tools/Listener.h"
 
-#include <gst/app/gstappsink.h>
 #include <gst/audio/audio.h>
 #include <gst/rtsp/gstrtspconnection.h>
 
@@ -8,28 +7,16 @@ namespace qivo::test {
 
 using namespace std::chrono;
 
-Listener::Listener(const std::string& address, const std::string& protocol) {
-    gst_init(nullptr, nullptr);
-    const std::string text = "rtspsrc latency=40 name=in protocols=" + protocol +
-                             " ! application/x-rtp,media=audio ! decodebin ! audioconvert ! "
-                             "audio/x-raw,format=F32LE,layout=interleaved ! appsink name=out sync=false max-buffers=0";
-    GstElement* parsed = gst_parse_launch(text.c_str(), nullptr);
-    m_pipeline.reset(GST_ELEMENT(gst_object_ref_sink(parsed)));
-    m_sink.reset(gst_bin_get_by_name(GST_BIN(parsed), "out"));
-    const Object<GstElement> in(gst_bin_get_by_name(GST_BIN(parsed), "in"));
-    g_object_set(in.get(), "location", address.c_str(), nullptr);
-    gst_element_set_state(parsed, GST_STATE_PLAYING);
-}
-
-Listener::~Listener() {
-    gst_element_set_state(m_pipeline.get(), GST_STATE_NULL);
-}
+Listener::Listener(const std::string& address, const std::string& protocol)
+    : m_stream(
+          address, protocol, "audio", 40,
+          "audioconvert ! audio/x-raw,format=F32LE,layout=interleaved ! appsink name=out sync=false max-buffers=0") {}
 
 Heard Listener::hear(milliseconds length, milliseconds deadline) {
     const auto end = steady_clock::now() + deadline;
     Heard heard;
     while (heard.seconds() < duration<double>(length).count() && steady_clock::now() < end) {
-        const Sample sample(gst_app_sink_try_pull_sample(GST_APP_SINK(m_sink.get()), 100 * GST_MSECOND));
+        const Sample sample = m_stream.next(milliseconds(100));
         GstAudioInfo info;
         GstMapInfo map;
         if (!sample || !gst_audio_info_from_caps(&info, gst_sample_get_caps(sample.get())) ||

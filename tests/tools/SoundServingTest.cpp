@@ -13,6 +13,7 @@
 
 #include <cmath>
 #include <set>
+#include <thread>
 
 namespace qivo::test {
 namespace {
@@ -103,6 +104,19 @@ TEST(SoundServing, viewersAndListenersComeAndGoInAnyOrder) {
         EXPECT_GE(listener.hear(200ms).seconds(), 0.2) << i;
         Watcher another(publisher.address(0));
         ASSERT_TRUE(another.next()) << i;
+    }
+}
+
+TEST(SoundServing, whoeverComesWhileTheLastOneLeavesIsServed) {
+    const PublishProcess publisher({"--size", "320x240"});
+    auto watcher = std::make_unique<Watcher>(publisher.address(0));
+    ASSERT_TRUE(watcher->next());
+    for (int i = 0; i < 20; ++i) {
+        std::thread leaving([last = std::move(watcher)]() mutable { last.reset(); });
+        std::this_thread::sleep_for(i * 1ms); // the leaving has come so far
+        watcher = std::make_unique<Watcher>(publisher.address(0));
+        leaving.join();
+        ASSERT_TRUE(watcher->next()) << i;
     }
 }
 
