@@ -28,6 +28,18 @@ class Listener {
     StreamClient m_stream;
 };
 
+/// A listener to L16 or L24 that takes the samples from the packets itself, in the order in which they lie there.
+class PacketListener {
+  public:
+    explicit PacketListener(const std::string& address, const std::string& protocol = "udp");
+
+    /// What comes next, this long; less if the deadline passes first.
+    Heard hear(std::chrono::milliseconds length, std::chrono::milliseconds deadline = std::chrono::seconds(15));
+
+  private:
+    StreamClient m_stream;
+};
+
 /// The server's description of what it serves at an address, in SDP; empty if it gives none.
 std::string descriptionOf(const std::string& address);
 

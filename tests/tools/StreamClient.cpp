@@ -20,7 +20,7 @@ StreamClient::StreamClient(const std::string& address, const std::string& protoc
                            const std::string& behind) {
     gst_init(nullptr, nullptr);
     const std::string text =
-        "rtspsrc name=in latency=" + std::to_string(latency) + " protocols=" + protocol + " ! decodebin ! " + behind;
+        "rtspsrc name=in latency=" + std::to_string(latency) + " protocols=" + protocol + " ! " + behind;
     GstElement* parsed = gst_parse_launch(text.c_str(), nullptr);
     m_pipeline.reset(GST_ELEMENT(gst_object_ref_sink(parsed)));
     m_sink = element("out");

@@ -10,8 +10,8 @@ namespace qivo::test {
 /// One medium of an RTSP address, "video" or "audio", by GStreamer's own receiver. It asks the server for no other.
 class StreamClient {
   public:
-    /// `behind` is what decoded data goes through, as gst-launch takes it, and ends in an appsink "out". `latency` is
-    /// in milliseconds.
+    /// `behind` is what its packets go through, as gst-launch takes it, and ends in an appsink "out". `latency` is in
+    /// milliseconds.
     StreamClient(const std::string& address, const std::string& protocol, const char* medium, int latency,
                  const std::string& behind);
     ~StreamClient();

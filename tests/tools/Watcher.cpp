@@ -23,7 +23,7 @@ std::optional<std::int64_t> Frame::latency() const {
 
 Watcher::Watcher(const std::string& address, const std::string& protocol)
     : m_stream(address, protocol, "video", 0,
-               "videoconvert name=convert ! video/x-raw,format=RGBA ! "
+               "decodebin ! videoconvert name=convert ! video/x-raw,format=RGBA ! "
                "appsink name=out sync=false wait-on-eos=false max-buffers=4 drop=true") {}
 
 std::optional<Frame> Watcher::next(milliseconds deadline) {
