@@ -70,6 +70,7 @@ bool SoundBranch::build(GstBin* bin, GstPad* pad, const std::string& encoding) {
     const SoundCodec& codec = *soundCodecFor(encoding);
     const GstOwned<GstCaps> floats(gst_caps_new_simple("audio/x-raw", "format", G_TYPE_STRING, GST_AUDIO_NE(F32),
                                                        "layout", G_TYPE_STRING, "interleaved", nullptr));
+    m_order = codec.order;
     std::vector<GstElement*> chain{makeElement(codec.depayloader)};
     if (codec.parser != nullptr) {
         chain.push_back(makeElement(codec.parser));
@@ -82,6 +83,9 @@ bool SoundBranch::build(GstBin* bin, GstPad* pad, const std::string& encoding) {
     chain.insert(chain.end(), {converter, makeFilter(floats.get()), sink});
     if (converter == nullptr || sink == nullptr || chain[1] == nullptr) {
         return appendChain(bin, pad, chain);
+    }
+    if (m_order == ChannelOrder::stream && chain[0] != nullptr) {
+        leaveUnsorted(chain[0]);
     }
     watchInput(chain[1], kDataProbe, Callbacks::unitComplete, this);
     watchInput(converter, GST_PAD_PROBE_TYPE_EVENT_DOWNSTREAM, Callbacks::decoded, this);
@@ -105,6 +109,11 @@ void SoundBranch::take(GstPad* pad, GstBuffer* buffer) {
     SoundCutter::Piece piece;
     piece.format = format;
     piece.samples = reinterpret_cast<const float*>(map.data);
+    std::vector<float> ordered;
+    if (m_order == ChannelOrder::opus) {
+        ordered = inOpusOrder(piece.samples, map.size / sizeof(float), info);
+        piece.samples = ordered.data();
+    }
     piece.count = map.size / static_cast<std::size_t>(GST_AUDIO_INFO_BPF(&info));
     piece.timecode = timecodeOf(buffer, segment);
     piece.arrived = wallClock();

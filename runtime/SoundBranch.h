@@ -1,5 +1,6 @@
 #pragma once
 
+#include "runtime/ChannelOrder.h"
 #include "runtime/GstHandles.h"
 #include "runtime/SoundCutter.h"
 
@@ -34,6 +35,7 @@ class SoundBranch {
 
     const Calls m_calls;
     SoundCutter m_cutter;
+    ChannelOrder m_order = ChannelOrder::decoder; // set before anything flows
 };
 
 } // namespace qivo::runtime

@@ -9,14 +9,14 @@ namespace qivo::runtime {
 namespace {
 
 constexpr std::array<SoundCodec, 8> kCodecs{{
-    {"L16", "rtpL16depay", nullptr, nullptr, true},
-    {"L24", "rtpL24depay", nullptr, nullptr, true},
-    {"PCMU", "rtppcmudepay", nullptr, "mulawdec", true},
-    {"PCMA", "rtppcmadepay", nullptr, "alawdec", true},
-    {"MPEG4-GENERIC", "rtpmp4gdepay", "aacparse", "avdec_aac", false},
-    {"MP4A-LATM", "rtpmp4adepay", "aacparse", "avdec_aac", false},
-    {"OPUS", "rtpopusdepay", nullptr, "opusdec", false},
-    {"MULTIOPUS", "rtpopusdepay", nullptr, "opusdec", false},
+    {"L16", "rtpL16depay", nullptr, nullptr, true, ChannelOrder::stream},
+    {"L24", "rtpL24depay", nullptr, nullptr, true, ChannelOrder::stream},
+    {"PCMU", "rtppcmudepay", nullptr, "mulawdec", true, ChannelOrder::decoder},
+    {"PCMA", "rtppcmadepay", nullptr, "alawdec", true, ChannelOrder::decoder},
+    {"MPEG4-GENERIC", "rtpmp4gdepay", "aacparse", "avdec_aac", false, ChannelOrder::decoder},
+    {"MP4A-LATM", "rtpmp4adepay", "aacparse", "avdec_aac", false, ChannelOrder::decoder},
+    {"OPUS", "rtpopusdepay", nullptr, "opusdec", false, ChannelOrder::opus},
+    {"MULTIOPUS", "rtpopusdepay", nullptr, "opusdec", false, ChannelOrder::opus},
 }};
 
 struct StaticPayload {
@@ -36,18 +36,6 @@ const StaticPayload* staticPayloadOf(const GstStructure* rtp) {
     return it != kStaticPayloads.end() ? it : nullptr;
 }
 
-/// What the encoding's parameters say, one where they say nothing; 0 where they make no sense.
-int describedChannels(const GstStructure* rtp) {
-    constexpr gint64 kMost = 1000;
-    const char* parameters = gst_structure_get_string(rtp, "encoding-params");
-    if (parameters == nullptr || *parameters == '\0') {
-        const StaticPayload* known = staticPayloadOf(rtp);
-        return known != nullptr ? known->channels : 1;
-    }
-    gint64 channels = 0;
-    return g_ascii_string_to_signed(parameters, 10, 0, kMost, &channels, nullptr) ? static_cast<int>(channels) : 0;
-}
-
 } // namespace
 
 const SoundCodec* soundCodecFor(const std::string& encoding) {
@@ -64,6 +52,17 @@ std::string encodingOf(const GstStructure* rtp) {
     }
     std::transform(encoding.begin(), encoding.end(), encoding.begin(), [](char c) { return g_ascii_toupper(c); });
     return encoding;
+}
+
+int describedChannels(const GstStructure* rtp) {
+    constexpr gint64 kMost = 1000;
+    const char* parameters = gst_structure_get_string(rtp, "encoding-params");
+    if (parameters == nullptr || *parameters == '\0') {
+        const StaticPayload* known = staticPayloadOf(rtp);
+        return known != nullptr ? known->channels : 1;
+    }
+    gint64 channels = 0;
+    return g_ascii_string_to_signed(parameters, 10, 0, kMost, &channels, nullptr) ? static_cast<int>(channels) : 0;
 }
 
 std::string soundProblem(const GstStructure* rtp) {

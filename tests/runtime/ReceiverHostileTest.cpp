@@ -3,6 +3,7 @@
 
 #include "tests/runtime/RawServer.h"
 #include "tests/runtime/ReceiverFixture.h"
+#include "tests/runtime/RtpPackets.h"
 
 #include <ostream>
 #include <string>
@@ -138,23 +139,6 @@ std::string noise(std::size_t length) {
 }
 
 // --- Packets.
-
-std::string big16(unsigned value) {
-    return {static_cast<char>(value >> 8U & 0xffU), static_cast<char>(value & 0xffU)};
-}
-
-std::string big32(unsigned value) {
-    return big16(value >> 16U) + big16(value & 0xffffU);
-}
-
-std::string interleaved(const std::string& packet, unsigned channel = 0) {
-    return "$" + std::string(1, static_cast<char>(channel)) + big16(static_cast<unsigned>(packet.size())) + packet;
-}
-
-std::string rtp(unsigned sequence, unsigned time, const std::string& payload, unsigned type = 96, bool marker = true) {
-    return big16(0x8000U | (marker ? 0x80U : 0U) | type) + big16(sequence & 0xffffU) + big32(time) + big32(0x12345678) +
-           payload;
-}
 
 /// Sends packets at fifty a second until the other side closes.
 std::function<void(Connection&)> packets(const std::function<std::string(unsigned)>& bytes) {

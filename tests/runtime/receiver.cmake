@@ -3,7 +3,7 @@ set(unwind "ASAN_OPTIONS=detect_leaks=1:detect_stack_use_after_return=1:strict_s
 
 add_library(qivo_receiver_fixture STATIC CountingAllocator.cpp CountingAllocator.h
                                          ReceiverFixture.cpp ReceiverFixture.h RtspServer.cpp RtspServer.h
-                                         RawServer.cpp RawServer.h)
+                                         RawServer.cpp RawServer.h RtpPackets.h)
 target_link_libraries(qivo_receiver_fixture PUBLIC qivo_runtime PkgConfig::GSTRTSPSERVER GTest::gtest)
 
 qivo_test(receiver-streams SOURCES ReceiverStreamTest.cpp LIBRARIES qivo_receiver_fixture NETWORK BUSY
@@ -12,7 +12,7 @@ qivo_test(receiver-hostile SOURCES ReceiverHostileTest.cpp LIBRARIES qivo_receiv
           ENVIRONMENT ${unwind})
 qivo_test(receiver-healing SOURCES ReceiverHealingTest.cpp LIBRARIES qivo_receiver_fixture NETWORK BUSY
           ENVIRONMENT ${unwind})
-qivo_test(sound-parts SOURCES SoundQueueTest.cpp LIBRARIES qivo_runtime TSAN)
+qivo_test(sound-parts SOURCES ChannelOrderTest.cpp SoundQueueTest.cpp LIBRARIES qivo_runtime TSAN)
 qivo_test(receiver-sound SOURCES ReceiverSoundTest.cpp LIBRARIES qivo_receiver_fixture qivo_test_tone NETWORK BUSY
           ENVIRONMENT ${unwind} TIMEOUT 120)
 qivo_test(receiver-parts SOURCES ReceiverPartsTest.cpp LIBRARIES qivo_runtime TSAN)

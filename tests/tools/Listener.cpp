@@ -1,6 +1,5 @@
 #include "tests/tools/Listener.h"
 
-#include <gst/app/gstappsink.h>
 #include <gst/audio/audio.h>
 #include <gst/rtsp/gstrtspconnection.h>
 
@@ -8,43 +7,64 @@ namespace qivo::test {
 
 using namespace std::chrono;
 
-Listener::Listener(const std::string& address, const std::string& protocol) {
-    gst_init(nullptr, nullptr);
-    const std::string text = "rtspsrc latency=40 name=in protocols=" + protocol +
-                             " ! application/x-rtp,media=audio ! decodebin ! audioconvert ! "
-                             "audio/x-raw,format=F32LE,layout=interleaved ! appsink name=out sync=false max-buffers=0";
-    GstElement* parsed = gst_parse_launch(text.c_str(), nullptr);
-    m_pipeline.reset(GST_ELEMENT(gst_object_ref_sink(parsed)));
-    m_sink.reset(gst_bin_get_by_name(GST_BIN(parsed), "out"));
-    const Object<GstElement> in(gst_bin_get_by_name(GST_BIN(parsed), "in"));
-    g_object_set(in.get(), "location", address.c_str(), nullptr);
-    gst_element_set_state(parsed, GST_STATE_PLAYING);
-}
+namespace {
 
-Listener::~Listener() {
-    gst_element_set_state(m_pipeline.get(), GST_STATE_NULL);
-}
-
-Heard Listener::hear(milliseconds length, milliseconds deadline) {
+/// `add` is called with what has come, as it comes, until it is long enough.
+template <typename Add>
+Heard hearFrom(StreamClient& stream, milliseconds length, milliseconds deadline, const Add& add) {
     const auto end = steady_clock::now() + deadline;
     Heard heard;
     while (heard.seconds() < duration<double>(length).count() && steady_clock::now() < end) {
-        const Sample sample(gst_app_sink_try_pull_sample(GST_APP_SINK(m_sink.get()), 100 * GST_MSECOND));
-        GstAudioInfo info;
+        const Sample sample = stream.next(milliseconds(100));
         GstMapInfo map;
-        if (!sample || !gst_audio_info_from_caps(&info, gst_sample_get_caps(sample.get())) ||
-            !gst_buffer_map(gst_sample_get_buffer(sample.get()), &map, GST_MAP_READ)) {
-            continue;
+        if (sample && gst_buffer_map(gst_sample_get_buffer(sample.get()), &map, GST_MAP_READ)) {
+            add(heard, gst_sample_get_caps(sample.get()), map);
+            gst_buffer_unmap(gst_sample_get_buffer(sample.get()), &map);
+        }
+    }
+    return heard;
+}
+
+} // namespace
+
+Listener::Listener(const std::string& address, const std::string& protocol)
+    : m_stream(address, protocol, "audio", 40,
+               "decodebin ! audioconvert ! audio/x-raw,format=F32LE,layout=interleaved ! "
+               "appsink name=out sync=false max-buffers=0") {}
+
+Heard Listener::hear(milliseconds length, milliseconds deadline) {
+    return hearFrom(m_stream, length, deadline, [](Heard& heard, const GstCaps* caps, const GstMapInfo& bytes) {
+        GstAudioInfo info;
+        if (!gst_audio_info_from_caps(&info, caps)) {
+            return;
         }
         heard.rate = info.rate;
         heard.planes.resize(static_cast<std::size_t>(info.channels));
-        const auto* samples = reinterpret_cast<const float*>(map.data);
-        for (std::size_t i = 0; i < map.size / sizeof(float); ++i) {
+        const auto* samples = reinterpret_cast<const float*>(bytes.data);
+        for (std::size_t i = 0; i < bytes.size / sizeof(float); ++i) {
             heard.planes[i % heard.planes.size()].push_back(samples[i]);
         }
-        gst_buffer_unmap(gst_sample_get_buffer(sample.get()), &map);
-    }
-    return heard;
+    });
+}
+
+PacketListener::PacketListener(const std::string& address, const std::string& protocol)
+    : m_stream(address, protocol, "audio", 40, "appsink name=out sync=false max-buffers=0") {}
+
+Heard PacketListener::hear(milliseconds length, milliseconds deadline) {
+    return hearFrom(m_stream, length, deadline, [](Heard& heard, const GstCaps* caps, const GstMapInfo& packet) {
+        constexpr std::size_t header = 12;
+        const GstStructure* description = gst_caps_get_structure(caps, 0);
+        const std::string encoding = gst_structure_get_string(description, "encoding-name");
+        const char* channels = gst_structure_get_string(description, "encoding-params");
+        const std::size_t width = encoding == "L24" ? 3 : 2;
+        gst_structure_get_int(description, "clock-rate", &heard.rate);
+        heard.planes.resize(channels != nullptr ? std::stoul(channels) : 1);
+        for (std::size_t i = 0; header + (i + 1) * width <= packet.size; ++i) {
+            const std::uint8_t* bytes = packet.data + header + i * width;
+            const auto sample = static_cast<std::int16_t>(bytes[0] << 8U | bytes[1]);
+            heard.planes[i % heard.planes.size()].push_back(static_cast<float>(sample) / 32768.0F);
+        }
+    });
 }
 
 std::string descriptionOf(const std::string& address) {

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "tools/publish/Handles.h"
+#include "tests/tools/StreamClient.h"
 
 #include <chrono>
 #include <string>
@@ -16,20 +16,28 @@ struct Heard {
     [[nodiscard]] double seconds() const { return planes.empty() ? 0.0 : static_cast<double>(planes[0].size()) / rate; }
 };
 
-/// A listener to an RTSP address, built of GStreamer's own receiver.
+/// A listener to an RTSP address: to its sound alone.
 class Listener {
   public:
     explicit Listener(const std::string& address, const std::string& protocol = "udp");
-    ~Listener();
-    Listener(const Listener&) = delete;
-    Listener& operator=(const Listener&) = delete;
 
     /// What comes next, this long; less if the deadline passes first.
     Heard hear(std::chrono::milliseconds length, std::chrono::milliseconds deadline = std::chrono::seconds(15));
 
   private:
-    Object<GstElement> m_pipeline;
-    Object<GstElement> m_sink;
+    StreamClient m_stream;
+};
+
+/// A listener to L16 or L24 that takes the samples from the packets itself, in the order in which they lie there.
+class PacketListener {
+  public:
+    explicit PacketListener(const std::string& address, const std::string& protocol = "udp");
+
+    /// What comes next, this long; less if the deadline passes first.
+    Heard hear(std::chrono::milliseconds length, std::chrono::milliseconds deadline = std::chrono::seconds(15));
+
+  private:
+    StreamClient m_stream;
 };
 
 /// The server's description of what it serves at an address, in SDP; empty if it gives none.

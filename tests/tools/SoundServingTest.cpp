@@ -12,15 +12,17 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
-#include <set>
+#include <thread>
 
 namespace qivo::test {
 namespace {
 
 using namespace std::chrono_literals;
 
-/// Whether every channel carries the tone of the source; a packet that a busy machine loses costs a new try.
-void expectTones(Listener& listener, std::size_t source, int rate, int channels, double tolerance) {
+/// Whether every channel carries its tone of the source, in this order; a packet that a busy machine loses costs a new
+/// try.
+template <typename AnyListener>
+void expectTones(AnyListener& listener, std::size_t source, int rate, int channels, double tolerance) {
     Heard heard;
     for (int tries = 0; tries < 4; ++tries) {
         heard = listener.hear(500ms);
@@ -32,20 +34,12 @@ void expectTones(Listener& listener, std::size_t source, int rate, int channels,
     }
     ASSERT_EQ(heard.planes.size(), static_cast<std::size_t>(channels));
     EXPECT_EQ(heard.rate, rate);
-    std::set<int> found;
     for (int channel = 0; channel < channels; ++channel) {
         const auto& plane = heard.planes[static_cast<std::size_t>(channel)];
-        // Beyond the second a receiver may put channels where it takes them to belong.
-        const auto heardFrequency = static_cast<int>(std::lround(frequencyOf(plane, rate)));
-        const int sent = channel < 2 ? channel : (heardFrequency - toneFrequency(source, 0)) / 256;
-        const int frequency = toneFrequency(source, sent);
+        const int frequency = toneFrequency(source, channel);
         EXPECT_NEAR(frequencyOf(plane, rate), frequency, 1.0) << channel;
         EXPECT_NEAR(amplitudeAt(plane, rate, frequency), toneAmplitude, tolerance * toneAmplitude) << channel;
-        found.insert(sent);
     }
-    EXPECT_EQ(found.size(), static_cast<std::size_t>(channels)) << "each channel has a tone of its own";
-    EXPECT_GE(*found.begin(), 0);
-    EXPECT_LT(*found.rbegin(), channels);
 }
 
 TEST(SoundServing, everySourceHasItsToneInBothStreamsOverUdpAndTcp) {
@@ -59,24 +53,44 @@ TEST(SoundServing, everySourceHasItsToneInBothStreamsOverUdpAndTcp) {
     }
 }
 
-TEST(SoundServing, everyCodecRateAndNumberOfChannels) {
-    struct Case {
-        const char* codec;
-        int rate;
-        int channels;
-        double tolerance;
-    };
-    for (const Case& wanted : {Case{"l16", 44100, 1, 0.01}, Case{"l16", 8000, 8, 0.01}, Case{"l16", 192000, 2, 0.01},
-                               Case{"l24", 96000, 6, 0.01}, Case{"aac", 44100, 2, 0.1}, Case{"opus", 48000, 2, 0.1},
-                               Case{"pcmu", 8000, 1, 0.1}}) {
+struct Format {
+    const char* codec;
+    int rate;
+    int channels;
+    double tolerance = 0.01; ///< of the level
+};
+
+template <typename AnyListener>
+void expectTonesAs(const std::vector<Format>& formats) {
+    for (const Format& wanted : formats) {
         const PublishProcess publisher({"--size", "320x240", "--audio-codec", wanted.codec, "--audio-rate",
                                         std::to_string(wanted.rate), "--audio-channels",
                                         std::to_string(wanted.channels)});
-        SCOPED_TRACE(std::string(wanted.codec) + " " + std::to_string(wanted.rate));
-        Listener listener(publisher.address(0));
+        SCOPED_TRACE(std::string(wanted.codec) + " " + std::to_string(wanted.rate) + " " +
+                     std::to_string(wanted.channels));
+        AnyListener listener(publisher.address(0));
         listener.hear(300ms);
         expectTones(listener, 0, wanted.rate, wanted.channels, wanted.tolerance);
     }
+}
+
+TEST(SoundServing, everyCodecRateAndChannel) {
+    expectTonesAs<Listener>({{"l16", 44100, 1},
+                             {"l16", 192000, 2},
+                             {"aac", 44100, 2, 0.1},
+                             {"opus", 48000, 2, 0.1},
+                             {"pcmu", 8000, 1, 0.1}});
+}
+
+TEST(SoundServing, channelsLieInThePacketsInTheirOrder) {
+    expectTonesAs<PacketListener>({{"l16", 48000, 3},
+                                   {"l16", 44100, 4},
+                                   {"l16", 48000, 5},
+                                   {"l16", 48000, 6},
+                                   {"l16", 48000, 7},
+                                   {"l16", 8000, 8},
+                                   {"l24", 96000, 6},
+                                   {"l24", 48000, 8}});
 }
 
 TEST(SoundServing, toneGoesOnWithoutAClick) {
@@ -103,6 +117,19 @@ TEST(SoundServing, viewersAndListenersComeAndGoInAnyOrder) {
         EXPECT_GE(listener.hear(200ms).seconds(), 0.2) << i;
         Watcher another(publisher.address(0));
         ASSERT_TRUE(another.next()) << i;
+    }
+}
+
+TEST(SoundServing, whoeverComesWhileTheLastOneLeavesIsServed) {
+    const PublishProcess publisher({"--size", "320x240"});
+    auto watcher = std::make_unique<Watcher>(publisher.address(0));
+    ASSERT_TRUE(watcher->next());
+    for (int i = 0; i < 20; ++i) {
+        std::thread leaving([last = std::move(watcher)]() mutable { last.reset(); });
+        std::this_thread::sleep_for(i * 1ms); // the leaving has come so far
+        watcher = std::make_unique<Watcher>(publisher.address(0));
+        leaving.join();
+        ASSERT_TRUE(watcher->next()) << i;
     }
 }
 

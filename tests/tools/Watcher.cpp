@@ -2,7 +2,6 @@
 
 #include "tools/publish/TimeCode.h"
 
-#include <gst/app/gstappsink.h>
 #include <gst/video/video.h>
 #include <gtest/gtest.h>
 
@@ -22,25 +21,13 @@ std::optional<std::int64_t> Frame::latency() const {
                 : std::nullopt;
 }
 
-Watcher::Watcher(const std::string& address, const std::string& protocol) {
-    gst_init(nullptr, nullptr);
-    const std::string text = "rtspsrc latency=0 name=in protocols=" + protocol + " ! application/x-rtp,media=video" +
-                             " ! decodebin ! videoconvert name=convert ! video/x-raw,format=RGBA ! "
-                             "appsink name=out sync=false wait-on-eos=false max-buffers=4 drop=true";
-    GstElement* parsed = gst_parse_launch(text.c_str(), nullptr);
-    m_pipeline.reset(GST_ELEMENT(gst_object_ref_sink(parsed)));
-    m_sink.reset(gst_bin_get_by_name(GST_BIN(parsed), "out"));
-    const Object<GstElement> in(gst_bin_get_by_name(GST_BIN(parsed), "in"));
-    g_object_set(in.get(), "location", address.c_str(), nullptr);
-    gst_element_set_state(parsed, GST_STATE_PLAYING);
-}
-
-Watcher::~Watcher() {
-    gst_element_set_state(m_pipeline.get(), GST_STATE_NULL);
-}
+Watcher::Watcher(const std::string& address, const std::string& protocol)
+    : m_stream(address, protocol, "video", 0,
+               "decodebin ! videoconvert name=convert ! video/x-raw,format=RGBA ! "
+               "appsink name=out sync=false wait-on-eos=false max-buffers=4 drop=true") {}
 
 std::optional<Frame> Watcher::next(milliseconds deadline) {
-    const Sample sample(gst_app_sink_try_pull_sample(GST_APP_SINK(m_sink.get()), nanoseconds(deadline).count()));
+    const Sample sample = m_stream.next(deadline);
     if (!sample) {
         return std::nullopt;
     }
@@ -66,7 +53,7 @@ std::optional<Frame> Watcher::next(milliseconds deadline) {
 }
 
 std::string Watcher::colorimetry() const {
-    const Object<GstElement> convert(gst_bin_get_by_name(GST_BIN(m_pipeline.get()), "convert"));
+    const Object<GstElement> convert = m_stream.element("convert");
     const Object<GstPad> pad(gst_element_get_static_pad(convert.get(), "sink"));
     const Caps caps(gst_pad_get_current_caps(pad.get()));
     const char* text = caps ? gst_structure_get_string(gst_caps_get_structure(caps.get(), 0), "colorimetry") : nullptr;
@@ -74,8 +61,7 @@ std::string Watcher::colorimetry() const {
 }
 
 bool Watcher::waitForEnd(milliseconds deadline) {
-    const Object<GstBus> bus(gst_element_get_bus(m_pipeline.get()));
-    const Message message(gst_bus_timed_pop_filtered(bus.get(), nanoseconds(deadline).count(),
+    const Message message(gst_bus_timed_pop_filtered(m_stream.bus().get(), nanoseconds(deadline).count(),
                                                      static_cast<GstMessageType>(GST_MESSAGE_EOS | GST_MESSAGE_ERROR)));
     return message != nullptr;
 }

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "tools/publish/Handles.h"
+#include "tests/tools/StreamClient.h"
 
 #include <chrono>
 #include <cstdint>
@@ -25,13 +25,10 @@ struct Frame {
     [[nodiscard]] std::optional<std::int64_t> timeCode() const;
 };
 
-/// A viewer of an RTSP address, built of GStreamer's own receiver.
+/// A viewer of an RTSP address: of its pictures alone.
 class Watcher {
   public:
     explicit Watcher(const std::string& address, const std::string& protocol = "udp");
-    ~Watcher();
-    Watcher(const Watcher&) = delete;
-    Watcher& operator=(const Watcher&) = delete;
 
     /// The next picture; empty after the deadline, or once the stream has ended.
     std::optional<Frame> next(std::chrono::milliseconds deadline = std::chrono::seconds(15));
@@ -41,8 +38,7 @@ class Watcher {
     bool waitForEnd(std::chrono::milliseconds deadline);
 
   private:
-    Object<GstElement> m_pipeline;
-    Object<GstElement> m_sink;
+    StreamClient m_stream;
 };
 
 } // namespace qivo::test
