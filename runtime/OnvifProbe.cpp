@@ -28,7 +28,8 @@ OnvifProbe::Result OnvifProbe::run() {
 
 SoapClient::Answer OnvifProbe::ask(const std::string& url, const SoapMessage& message) {
     SoapClient::Answer answer = m_client.ask(url, message, kStepLimit, m_ended);
-    m_result.answered = m_result.answered || answer.status != 0;
+    // A web server whose services have not started yet answers too, but not in their language.
+    m_result.answered = m_result.answered || answer.reply || (answer.status >= 400 && answer.status < 500);
     return answer;
 }
 

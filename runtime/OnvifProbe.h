@@ -33,7 +33,7 @@ class OnvifProbe {
 
     struct Result {
         std::optional<OnvifCamera> camera;
-        bool answered = false; ///< whether the device has spoken at all; if not, it may yet
+        bool answered = false; ///< whether the services have spoken at all; if not, they may yet
         std::string reason;    ///< why there is no camera
     };
 

@@ -174,15 +174,15 @@ TEST_F(SteeringCameraTest, AMoveThatTakesEffectAfterItsStopIsStoppedAgain) {
 }
 
 TEST_F(SteeringCameraTest, AStopThatIsLostIsAskedAgain) {
-    auto lost = std::make_shared<std::atomic<int>>(0);
+    const auto first = std::make_shared<std::atomic<Clock::time_point>>(Clock::time_point::max());
     ScriptedCamera camera(
-        [lost](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
+        [first](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
             const bool stops = call.operation == "Stop" || call.after("PanTilt x=\"") == "0.0000";
-            if (!stops || ++*lost > 4) {
-                return false;
+            auto none = Clock::time_point::max();
+            if (stops) {
+                first->compare_exchange_strong(none, call.at);
             }
-            *lost % 2 == 0 ? connection.close() : static_cast<void>(connection.send(self.http(self.fault("busy"))));
-            return true;
+            return stops && call.at < first->load() + 300ms && connection.send(self.http(self.fault("busy")));
         },
         0, movesOn);
     const auto steering = steer(camera);
