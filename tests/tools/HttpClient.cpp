@@ -27,24 +27,38 @@ bool RawConnection::send(const std::string& text) {
     return ::send(m_socket, text.data(), text.size(), MSG_NOSIGNAL) == static_cast<ssize_t>(text.size());
 }
 
-std::string RawConnection::readUntil(const std::string& marker, std::chrono::milliseconds deadline) {
+// Gives so many bytes as `length` says once it does not say 0; whatever there is at the end or the deadline.
+std::string RawConnection::take(const std::function<std::size_t()>& length, std::chrono::milliseconds deadline) {
     const auto end = std::chrono::steady_clock::now() + deadline;
-    while (marker.empty() || m_rest.find(marker) == std::string::npos) {
+    while (length() == 0) {
         const auto left =
             std::chrono::duration_cast<std::chrono::milliseconds>(end - std::chrono::steady_clock::now()).count();
         pollfd waiting{m_socket, POLLIN, 0};
         if (m_ended || left <= 0 || poll(&waiting, 1, static_cast<int>(left)) <= 0) {
             return std::exchange(m_rest, {});
         }
-        std::array<char, 4096> bytes{};
+        std::array<char, 65536> bytes;
         const ssize_t count = recv(m_socket, bytes.data(), bytes.size(), 0);
         m_ended = count <= 0;
         m_rest.append(bytes.data(), count > 0 ? static_cast<std::size_t>(count) : 0);
     }
-    const std::size_t length = m_rest.find(marker) + marker.size();
-    const std::string read = m_rest.substr(0, length);
-    m_rest.erase(0, length);
+    const std::size_t whole = length();
+    const std::string read = m_rest.substr(0, whole);
+    m_rest.erase(0, whole);
     return read;
+}
+
+std::string RawConnection::readUntil(const std::string& marker, std::chrono::milliseconds deadline) {
+    return take(
+        [&] {
+            const std::size_t at = marker.empty() ? std::string::npos : m_rest.find(marker);
+            return at == std::string::npos ? 0 : at + marker.size();
+        },
+        deadline);
+}
+
+std::string RawConnection::read(std::size_t bytes, std::chrono::milliseconds deadline) {
+    return bytes == 0 ? "" : take([&] { return m_rest.size() >= bytes ? bytes : 0; }, deadline);
 }
 
 std::string RawConnection::readAll(std::chrono::milliseconds deadline) {

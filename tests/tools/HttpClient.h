@@ -1,6 +1,7 @@
 #pragma once
 
 #include <chrono>
+#include <functional>
 #include <string>
 
 namespace qivo::test {
@@ -19,6 +20,9 @@ class RawConnection {
     /// What comes until `marker`, the other end's leave or the deadline; with the marker.
     std::string readUntil(const std::string& marker, std::chrono::milliseconds deadline = std::chrono::seconds(10));
 
+    /// That many bytes; fewer at the other end's leave or the deadline.
+    std::string read(std::size_t bytes, std::chrono::milliseconds deadline = std::chrono::seconds(10));
+
     /// What comes until the other end takes leave or the deadline.
     std::string readAll(std::chrono::milliseconds deadline = std::chrono::seconds(10));
 
@@ -26,6 +30,8 @@ class RawConnection {
     [[nodiscard]] bool ended() const { return m_ended; }
 
   private:
+    std::string take(const std::function<std::size_t()>& length, std::chrono::milliseconds deadline);
+
     int m_socket = -1;
     bool m_ended = false;
     std::string m_rest;

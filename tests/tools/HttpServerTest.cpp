@@ -1,11 +1,8 @@
 #include "tools/publish/HttpServer.h"
-#include "tests/tools/HttpClient.h"
+#include "tests/tools/HttpFixture.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
-
-#include <future>
-#include <thread>
 
 namespace qivo::test {
 namespace {
@@ -14,7 +11,7 @@ using namespace std::chrono_literals;
 using testing::HasSubstr;
 using testing::Not;
 
-class HttpServing : public testing::Test {
+class HttpServing : public HttpFixture {
   protected:
     HttpServing() {
         m_server.route("GET", "/page", [](const HttpRequest&, HttpReply reply) {
@@ -34,16 +31,6 @@ class HttpServing : public testing::Test {
         EXPECT_EQ(m_server.listen(0, 0, true), "");
     }
 
-    /// Serves until what a client does on another thread is done.
-    template <typename Act>
-    auto serve(Act act) {
-        auto done = std::async(std::launch::async, act);
-        while (done.wait_for(1ms) != std::future_status::ready) {
-            while (g_main_context_iteration(nullptr, FALSE) != FALSE) {
-            }
-        }
-        return done.get();
-    }
     std::string ask(const std::string& request) {
         return serve([port = m_server.port(), request] { return test::ask(port, request); });
     }

@@ -184,6 +184,27 @@ TEST(Options, portsAreNumbersUpTo65535) {
     }
 }
 
+TEST(Options, theHttpPortFollowsTheSameRule) {
+    EXPECT_EQ(accepted({}).httpPort, -1);
+    EXPECT_EQ(accepted({"--http-port", "0"}).httpPort, 0);
+    EXPECT_EQ(refused({"--http-port", "http"}),
+              "--http-port \"http\": not a port; write a number from 0 (any free one) to 65535");
+}
+
+TEST(Options, aLoginIsAUserAndAPassword) {
+    EXPECT_FALSE(accepted({}).login);
+    EXPECT_EQ(accepted({"--login", "ada:secret:1"}).login->user, "ada");
+    EXPECT_EQ(accepted({"--login=ada:secret:1"}).login->password, "secret:1");
+}
+
+TEST(Options, aBadLoginIsRefusedWithoutSayingIt) {
+    for (const char* login : {"", "hush", "hush:", ":hush", "a\"b:hush", "a:hush\n"}) {
+        EXPECT_EQ(refused({"--login", login}),
+                  "--login: not a login; write USER:PASSWORD, each of 1 to 64 bytes without "
+                  "control characters, the user without \" and \\");
+    }
+}
+
 TEST(Options, webAddressesAreHttpOrHttps) {
     EXPECT_EQ(accepted({"--web", "HTTPS://cam.local:8080/a?b"}).sources[0].web, "HTTPS://cam.local:8080/a?b");
     for (const char* web : {"ftp://x/", "javascript:alert(1)", "x", "", "file:///etc/passwd"}) {
@@ -244,8 +265,9 @@ TEST(Options, helpNamesEveryOption) {
     const ParsedOptions parsed = parseOptions({"--help", "--nonsense"}, "host");
     ASSERT_TRUE(std::holds_alternative<PrintAndExit>(parsed));
     const std::string& text = std::get<PrintAndExit>(parsed).text;
-    for (const char* option : {"--machine", "--source", "--input", "--size", "--rate", "--codec", "--low-size",
-                               "--low-rate", "--web", "--loopback-only", "--port", "--help", "--version"}) {
+    for (const char* option :
+         {"--machine", "--source", "--input", "--size", "--rate", "--codec", "--low-size", "--low-rate", "--web",
+          "--loopback-only", "--port", "--http-port", "--login", "--help", "--version"}) {
         EXPECT_NE(text.find(std::string("  ") + option + " "), std::string::npos) << option;
     }
 }

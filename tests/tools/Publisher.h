@@ -20,6 +20,7 @@ class PublishProcess {
     /// The address in line `number`, counted from 0; empty if there is none.
     [[nodiscard]] std::string address(std::size_t number) const;
     [[nodiscard]] std::vector<std::string> lines() const;
+    [[nodiscard]] std::string errors() const { return m_process->errors(); }
     Process& process() { return *m_process; }
 
   private:

@@ -163,7 +163,9 @@ bool ControlPage::inOrder(const JsonObject& object) {
     if (page == nullptr || !order) {
         return true;
     }
-    return *order > page->order && (page->order = *order, true);
+    const bool later = *order > page->order;
+    page->order = std::max(*order, page->order);
+    return later;
 }
 
 bool ControlPage::obey(const std::string& verb, const JsonObject& object) {
@@ -181,7 +183,9 @@ bool ControlPage::obey(const std::string& verb, const JsonObject& object) {
     }
     if (verb == "automaticFocus") {
         const auto on = member<bool>(object, "on");
-        camera.setAutomaticFocus(on.value_or(camera.state().automaticFocus));
+        if (on) {
+            camera.setAutomaticFocus(*on);
+        }
         return on.has_value();
     }
     if (verb == "store") {

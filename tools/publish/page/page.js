@@ -8,6 +8,13 @@ const stateTime = 1000;
 const me = Array.from(crypto.getRandomValues(new Uint8Array(12)), (byte) => byte.toString(16).padStart(2, "0")).join("");
 const element = (id) => document.getElementById(id);
 
+// Left alone where nothing changes, so that a screen reader does not say it every second.
+function say(id, text) {
+    if (element(id).textContent !== text) {
+        element(id).textContent = text;
+    }
+}
+
 // --- Commands: one under way at a time and numbered, so that none overtakes another. -------------------------------
 
 // Starts where no earlier life of the page can have been.
@@ -287,7 +294,7 @@ let shown = 0;
 function setLive(on) {
     live = on;
     if (!on) {
-        element("state").textContent = "No connection";
+        say("state", "No connection");
         element("state").className = "lost";
     }
     element("notice").hidden = on;
@@ -339,10 +346,9 @@ async function look() {
 
 function show(state) {
     const doing = [state.turning && "turning", state.zooming && "zooming", state.focusing && "focusing"].filter(Boolean);
-    element("state").textContent = doing.length > 0 ? "Live, " + doing.join(" and ") : "Live";
+    say("state", doing.length > 0 ? "Live, " + doing.join(" and ") : "Live");
     element("state").className = "live";
-    element("name").textContent = state.name;
-    element("viewers").textContent = state.viewers === 1 ? "1 viewer" : state.viewers + " viewers";
+    say("viewers", state.viewers === 1 ? "1 viewer" : state.viewers + " viewers");
     [...element("presets").children].forEach((button, index) => {
         const kept = state.presets.includes(index + 1);
         button.classList.toggle("kept", kept);
