@@ -24,15 +24,11 @@ std::string seconds(std::chrono::milliseconds time) {
     return "PT" + xmlNumber(std::chrono::duration<double>(time).count()) + "S";
 }
 
-std::string rangeXml(const std::string& element, int minimum) {
-    return "<" + element + ">" + elementXml("tt:Min", std::to_string(minimum)) + elementXml("tt:Max", "1") + "</" +
-           element + ">";
-}
-
 // A space of one range for pan and tilt, or for one of them alone. The largest is 1.
 std::string spaceXml(const std::string& element, const char* space, int minimum, bool both = false) {
-    return "<" + element + ">" + elementXml("tt:URI", spaceUri(space)) + rangeXml("tt:XRange", minimum) +
-           (both ? rangeXml("tt:YRange", minimum) : "") + "</" + element + ">";
+    const std::string least = std::to_string(minimum);
+    return "<" + element + ">" + elementXml("tt:URI", spaceUri(space)) + rangeXml("tt:XRange", least, "1") +
+           (both ? rangeXml("tt:YRange", least, "1") : "") + "</" + element + ">";
 }
 
 std::string allSpacesXml() {
