@@ -21,7 +21,8 @@ packages_for_screen=(xvfb openbox x11-utils util-linux iproute2)
 # The suppressions of leaks name functions, which only llvm's symbolizer can tell.
 packages_to_test=(clang libclang-rt-14-dev llvm libegl1 libgl1 x11-xserver-utils dbus-daemon binutils pulseaudio
     pulseaudio-utils)
-packages_of_peers=(avahi-daemon avahi-utils dbus ffmpeg mpv picom chromium chromium-driver onvif-tools)
+packages_of_peers=(avahi-daemon avahi-utils dbus ffmpeg mpv picom chromium chromium-driver onvif-tools
+    libonvif-dev)
 # Clients that are published for Node alone; they go into build/peers.
 node_packages_of_peers=(onvif@0.8.3)
 packages_to_lint=(clang-format clang-tidy git)

@@ -50,26 +50,21 @@ OnvifResult setImagingSettings(const OnvifCall& call) {
     return "";
 }
 
-std::string rangeXml(const std::string& element, int minimum) {
-    return "<" + element + ">" + elementXml("tt:Min", std::to_string(minimum)) + elementXml("tt:Max", "1") + "</" +
-           element + ">";
-}
-
 OnvifResult getOptions(const OnvifCall& call) {
     if (auto fault = sourceFault(call)) {
         return *fault;
     }
     return "<timg:ImagingOptions><tt:Focus><tt:AutoFocusModes>AUTO</tt:AutoFocusModes>"
            "<tt:AutoFocusModes>MANUAL</tt:AutoFocusModes>" +
-           rangeXml("tt:DefaultSpeed", 1) + "</tt:Focus></timg:ImagingOptions>";
+           rangeXml("tt:DefaultSpeed", "1", "1") + "</tt:Focus></timg:ImagingOptions>";
 }
 
 OnvifResult getMoveOptions(const OnvifCall& call) {
     if (auto fault = sourceFault(call)) {
         return *fault;
     }
-    return "<timg:MoveOptions><tt:Absolute>" + rangeXml("tt:Position", 0) + "</tt:Absolute><tt:Relative>" +
-           rangeXml("tt:Distance", -1) + "</tt:Relative><tt:Continuous>" + rangeXml("tt:Speed", -1) +
+    return "<timg:MoveOptions><tt:Absolute>" + rangeXml("tt:Position", "0", "1") + "</tt:Absolute><tt:Relative>" +
+           rangeXml("tt:Distance", "-1", "1") + "</tt:Relative><tt:Continuous>" + rangeXml("tt:Speed", "-1", "1") +
            "</tt:Continuous></timg:MoveOptions>";
 }
 

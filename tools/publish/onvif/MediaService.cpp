@@ -123,17 +123,16 @@ OnvifResult getVideoEncoderConfigurationOptions(const OnvifCall& call) {
     if (stream == nullptr) {
         return noEncoder();
     }
-    const auto range = [](const std::string& element, const std::string& value) {
-        return "<" + element + ">" + elementXml("tt:Min", value) + elementXml("tt:Max", value) + "</" + element + ">";
-    };
     const std::string rate = rateOf(stream->rate);
-    const std::string common = range("tt:FrameRateRange", rate) + range("tt:EncodingIntervalRange", "1");
+    const std::string common =
+        rangeXml("tt:FrameRateRange", rate, rate) + rangeXml("tt:EncodingIntervalRange", "1", "1");
     const std::string codec =
         stream->codec == Codec::mjpeg
             ? "<tt:JPEG>" + sizeXml("tt:ResolutionsAvailable", stream->size) + common + "</tt:JPEG>"
-            : "<tt:H264>" + sizeXml("tt:ResolutionsAvailable", stream->size) + range("tt:GovLengthRange", rate) +
-                  common + "<tt:H264ProfilesSupported>Baseline</tt:H264ProfilesSupported></tt:H264>";
-    return "<trt:Options>" + range("tt:QualityRange", "1") + codec + "</trt:Options>";
+            : "<tt:H264>" + sizeXml("tt:ResolutionsAvailable", stream->size) +
+                  rangeXml("tt:GovLengthRange", rate, rate) + common +
+                  "<tt:H264ProfilesSupported>Baseline</tt:H264ProfilesSupported></tt:H264>";
+    return "<trt:Options>" + rangeXml("tt:QualityRange", "1", "1") + codec + "</trt:Options>";
 }
 
 OnvifResult getStreamUri(const OnvifCall& call) {

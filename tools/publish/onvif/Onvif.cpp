@@ -105,6 +105,10 @@ std::string elementXml(const std::string& name, const std::string& text) {
     return "<" + name + ">" + xmlText(text) + "</" + name + ">";
 }
 
+std::string rangeXml(const std::string& name, const std::string& minimum, const std::string& maximum) {
+    return "<" + name + ">" + elementXml("tt:Min", minimum) + elementXml("tt:Max", maximum) + "</" + name + ">";
+}
+
 const std::vector<OnvifService>& onvifServices() {
     static const std::vector<OnvifService> services{deviceService(), mediaService(), ptzService(), imagingService()};
     return services;

@@ -96,6 +96,9 @@ inline constexpr const char* onvifPtzConfiguration = "ptz";
 /** "<NAME>TEXT</NAME>", the text escaped. */
 [[nodiscard]] std::string elementXml(const std::string& name, const std::string& text);
 
+/** "<NAME><tt:Min>…</tt:Min><tt:Max>…</tt:Max></NAME>". */
+[[nodiscard]] std::string rangeXml(const std::string& name, const std::string& minimum, const std::string& maximum);
+
 /** An answer over HTTP. */
 struct OnvifAnswer {
     int status = 200;

@@ -24,15 +24,11 @@ std::string seconds(std::chrono::milliseconds time) {
     return "PT" + xmlNumber(std::chrono::duration<double>(time).count()) + "S";
 }
 
-std::string rangeXml(const std::string& element, int minimum) {
-    return "<" + element + ">" + elementXml("tt:Min", std::to_string(minimum)) + elementXml("tt:Max", "1") + "</" +
-           element + ">";
-}
-
 // A space of one range for pan and tilt, or for one of them alone. The largest is 1.
 std::string spaceXml(const std::string& element, const char* space, int minimum, bool both = false) {
-    return "<" + element + ">" + elementXml("tt:URI", spaceUri(space)) + rangeXml("tt:XRange", minimum) +
-           (both ? rangeXml("tt:YRange", minimum) : "") + "</" + element + ">";
+    const std::string least = std::to_string(minimum);
+    return "<" + element + ">" + elementXml("tt:URI", spaceUri(space)) + rangeXml("tt:XRange", least, "1") +
+           (both ? rangeXml("tt:YRange", least, "1") : "") + "</" + element + ">";
 }
 
 std::string allSpacesXml() {
@@ -221,15 +217,6 @@ SoapFault noPreset() {
     return invalidArgument("NoToken", "There is no preset of this token.");
 }
 
-bool hasPreset(const Camera& camera, const std::string& token) {
-    for (const auto& [number, preset] : camera.presets()) {
-        if (std::to_string(number) == token) {
-            return true;
-        }
-    }
-    return false;
-}
-
 bool nameTaken(const Camera& camera, const std::string& name, const std::string& token) {
     for (const auto& [number, preset] : camera.presets()) {
         if (preset.name == name && std::to_string(number) != token) {
@@ -246,7 +233,8 @@ OnvifResult setPreset(const OnvifCall& call) {
     Camera& camera = *call.camera.camera;
     const std::string name = call.operation.child("PresetName").text();
     std::string token = call.operation.child("PresetToken").text();
-    if (!token.empty() && !hasPreset(camera, token)) {
+    // A token that no preset has yet makes one: there are clients that number their presets themselves.
+    if (!token.empty() && !Camera::isPresetToken(token)) {
         return noPreset();
     }
     if (!name.empty() && nameTaken(camera, name, token)) {
