@@ -152,8 +152,9 @@ void WebBrowser::releaseAll() {
 }
 
 void WebBrowser::click(const std::string& selector) {
-    press(selector);
-    point({QJsonObject{{"type", "pointerUp"}, {"button", 0}}});
+    point({QJsonObject{{"type", "pointerMove"}, {"origin", find(selector)}, {"x", 0}, {"y", 0}, {"duration", 0}},
+           QJsonObject{{"type", "pointerDown"}, {"button", 0}}, QJsonObject{{"type", "pause"}, {"duration", 40}},
+           QJsonObject{{"type", "pointerUp"}, {"button", 0}}});
 }
 
 void WebBrowser::holdKey(const std::string& key) {
