@@ -6,7 +6,7 @@ packages_to_build=(
     g++ cmake ninja-build pkg-config
     qt6-base-dev libgl-dev libegl-dev libepoxy-dev
     libgstreamer1.0-dev libgstreamer-plugins-base1.0-dev libgstrtspserver-1.0-dev
-    libavahi-core-dev libglib2.0-dev libpango1.0-dev libsoup-3.0-dev libpulse-dev libsdl2-dev
+    libavahi-core-dev libglib2.0-dev libpango1.0-dev libsoup-3.0-dev libpulse-dev libsdl2-dev libxml2-dev
     libgtest-dev libgmock-dev libbenchmark-dev libx11-dev libxtst-dev libxcb1-dev
 )
 packages_to_run=(
@@ -19,7 +19,10 @@ packages_for_screen=(xvfb openbox x11-utils util-linux iproute2)
 # The suppressions of leaks name functions, which only llvm's symbolizer can tell.
 packages_to_test=(clang libclang-rt-14-dev llvm libegl1 libgl1 x11-xserver-utils dbus-daemon binutils pulseaudio
     pulseaudio-utils)
-packages_of_peers=(avahi-daemon avahi-utils dbus ffmpeg mpv picom chromium chromium-driver)
+packages_of_peers=(avahi-daemon avahi-utils dbus ffmpeg mpv picom chromium chromium-driver onvif-tools
+    libonvif-dev)
+# Clients that are published for Node alone; they go into build/peers.
+node_packages_of_peers=(onvif@0.8.3)
 packages_to_lint=(clang-format clang-tidy git)
 
 # install_packages NAME...: installs those that are missing, as root or with sudo.
@@ -48,6 +51,25 @@ install_packages() {
         exit 1
     fi
     rm -f "$log"
+}
+
+# install_node_packages NAME@VERSION...: puts those that are missing into build/peers, and npm where there is none.
+install_node_packages() {
+    command -v npm >/dev/null || install_packages nodejs npm
+    local missing=() package manifest
+    for package in "$@"; do
+        manifest=build/peers/node_modules/${package%@*}/package.json
+        grep -qs "\"version\": \"${package##*@}\"" "$manifest" || missing+=("$package")
+    done
+    [ ${#missing[@]} -gt 0 ] || return 0
+    echo "Installing ${#missing[@]} Node packages: ${missing[*]}"
+    mkdir -p build/peers
+    if ! npm install --prefix build/peers --no-save --no-package-lock --no-audit --no-fund --ignore-scripts \
+        "${missing[@]}" >build/peers/install.log 2>&1; then
+        tail -n 20 build/peers/install.log >&2
+        echo "The packages could not be installed; the whole output is in build/peers/install.log" >&2
+        exit 1
+    fi
 }
 
 # announce_build PRESET LOG: says that a build is under way once the build tool, whose output it reads, makes something.

@@ -1,5 +1,5 @@
 #include "tests/tools/OnvifFixture.h"
-#include "tools/publish/Handles.h"
+#include "tests/tools/OnvifToken.h"
 #include "tools/publish/onvif/Duration.h"
 
 namespace qivo::test {
@@ -8,32 +8,10 @@ namespace {
 using namespace std::chrono_literals;
 using testing::HasSubstr;
 
-// A WS-Security header, right unless a test changes it.
-struct Token {
-    std::string user = "admin";
-    std::string password = "secret";
-    std::string nonce = "0123456789abcdef";
-    std::string created;
-    std::string type = "#PasswordDigest";
-    std::string given; // in place of the digest
-
-    [[nodiscard]] std::string xml() const {
-        const Text encoded(g_base64_encode(reinterpret_cast<const guchar*>(nonce.data()), nonce.size()));
-        const std::string digest = given.empty() ? passwordDigest(nonce, created, password) : given;
-        return "<w:Security xmlns:w=\"http://docs.oasis-open.org/wss/2004/01/"
-               "oasis-200401-wss-wssecurity-secext-1.0.xsd\"><w:UsernameToken><w:Username>" +
-               user +
-               "</w:Username><w:Password Type=\"http://docs.oasis-open.org/wss/2004/01/"
-               "oasis-200401-wss-username-token-profile-1.0" +
-               type + "\">" + digest + "</w:Password><w:Nonce>" + encoded.get() + "</w:Nonce><w:Created>" + created +
-               "</w:Created></w:UsernameToken></w:Security>";
-    }
-};
-
 class OnvifLogin : public OnvifFixture {
   protected:
     OnvifLogin() {
-        makeDevice(std::make_shared<UsernameTokens>("admin", "secret", [this] { return m_utc; }));
+        makeDevice(std::make_shared<UsernameTokens>(Login{"admin", "secret"}, [this] { return m_utc; }));
     }
 
     Token token(std::chrono::seconds off = 0s) {
@@ -42,8 +20,9 @@ class OnvifLogin : public OnvifFixture {
         made.nonce += std::to_string(++m_nonces);
         return made;
     }
-    bool accepted(const Token& made) {
-        const OnvifAnswer found = answer(soap(call(ptzSpace, "GetNodes"), made.xml()));
+    bool accepted(const Token& made, const std::string& operation = "Stop") {
+        const OnvifAnswer found =
+            answer(soap(call(ptzSpace, operation, "<ProfileToken>full</ProfileToken>"), made.xml()));
         if (found.status != 200) {
             EXPECT_THAT(found.body, HasSubstr("ter:NotAuthorized"));
         }
@@ -100,6 +79,26 @@ TEST_F(OnvifLogin, aTokenIsGoodOnce) {
     m_utc += 1s;
     EXPECT_FALSE(accepted(made));
     EXPECT_TRUE(accepted(token()));
+}
+
+TEST_F(OnvifLogin, aTokenIsGoodForFurtherQuestionsForAMoment) {
+    const Token made = token();
+    EXPECT_TRUE(accepted(made, "GetNodes"));
+    m_utc += UsernameTokens::repetition;
+    EXPECT_TRUE(accepted(made, "GetStatus"));
+    EXPECT_FALSE(accepted(made, "Stop"));
+    m_utc += 1s;
+    EXPECT_FALSE(accepted(made, "GetStatus"));
+}
+
+TEST_F(OnvifLogin, tokensOfOneSecondAreToldApart) {
+    Token one = token();
+    Token other = one;
+    one.created = utcText(m_utc).substr(0, 19) + ".001Z";
+    other.created = utcText(m_utc).substr(0, 19) + ".002Z";
+    EXPECT_TRUE(accepted(one));
+    EXPECT_TRUE(accepted(other));
+    EXPECT_FALSE(accepted(one));
 }
 
 TEST_F(OnvifLogin, clocksMayBeOffByTheToleranceAndNoMore) {

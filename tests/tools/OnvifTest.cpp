@@ -229,8 +229,16 @@ TEST_F(Onvif, presetsAreSetListedRecalledAndRemoved) {
     expectPtzFault("GotoPreset", "<PresetToken>1</PresetToken>", "NoToken");
 }
 
+TEST_F(Onvif, aPresetIsMadeUnderTheTokenThatAClientChooses) {
+    EXPECT_THAT(askPtz("SetPreset", "<PresetToken>9</PresetToken>"), HasSubstr(">9</tptz:PresetToken>"));
+    EXPECT_THAT(askPtz("GetPresets", ""), HasSubstr("<tptz:Preset token=\"9\"><tt:Name>Preset 9</tt:Name>"));
+}
+
 TEST_F(Onvif, presetsOutOfRangeUnknownTakenOrMisnamedAreRefused) {
-    for (const char* token : {"1", "0", "65", "-1", "01", "x", "4294967297", "../../etc"}) {
+    for (const char* name : {"GotoPreset", "RemovePreset"}) {
+        expectPtzFault(name, "<PresetToken>1</PresetToken>", "NoToken");
+    }
+    for (const char* token : {"0", "65", "-1", "01", "x", "4294967297", "../../etc"}) {
         const std::string element = std::string("<PresetToken>") + token + "</PresetToken>";
         for (const char* name : {"SetPreset", "GotoPreset", "RemovePreset"}) {
             expectPtzFault(name, element, "NoToken");

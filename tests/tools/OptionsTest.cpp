@@ -12,7 +12,9 @@ Options accepted(const Arguments& arguments) {
     const auto* options = std::get_if<Options>(&parsed);
     EXPECT_NE(options, nullptr) << (std::holds_alternative<UsageError>(parsed) ? std::get<UsageError>(parsed).text
                                                                                : "");
-    return options != nullptr ? *options : Options{.machine = "", .sources = {SourceOptions{}}};
+    Options nothing;
+    nothing.sources.resize(1);
+    return options != nullptr ? *options : nothing;
 }
 
 std::string refused(const Arguments& arguments) {
@@ -49,6 +51,24 @@ TEST(Options, soundIsAStereoToneUnlessSaidOtherwise) {
     EXPECT_EQ(options.sources[1].audioCodec, SoundCodec::aac);
     EXPECT_FALSE(options.sources[2].audio);
     EXPECT_EQ(options.sources[2].audioRate, 48000);
+}
+
+TEST(Options, camerasToSteerAreSourcesOfTheirOwn) {
+    const Options options = accepted({"--http-port", "0", "--source", "A", "--source", "B", "--ptz"});
+    EXPECT_FALSE(options.sources[0].ptz);
+    EXPECT_TRUE(options.sources[1].ptz);
+    EXPECT_EQ(options.httpPort, 0);
+    EXPECT_TRUE(accepted({"--ptz", "--source", "A"}).sources[0].ptz) << "the default of all";
+    EXPECT_EQ(accepted({"--ptz"}).httpPort, -1);
+}
+
+TEST(Options, whatACameraToSteerCannotShowIsRefused) {
+    EXPECT_EQ(refused({"--source", "A", "--ptz", "--input", "x.mp4"}),
+              "source \"A\": --ptz and --input both say what is shown; leave out one");
+    EXPECT_EQ(refused({"--source", "A", "--ptz", "--codec", "h265"}),
+              "source \"A\": ONVIF names no H.265; steer a camera with --codec h264 or mjpeg");
+    EXPECT_EQ(refused({"--http-port", "65536"}),
+              "--http-port \"65536\": not a port; write a number from 0 (any free one) to 65535");
 }
 
 TEST(Options, soundOptionsBeforeTheFirstSourceAreTheDefaultOfAll) {

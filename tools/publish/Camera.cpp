@@ -219,6 +219,10 @@ void Camera::setAutomaticFocus(bool automatic) {
     ++m_serial;
 }
 
+bool Camera::isPresetToken(const std::string& token) {
+    return presetNumber(token) != 0;
+}
+
 bool Camera::storePreset(const std::string& token, const std::string& name) {
     const int number = presetNumber(token);
     if (number == 0 || name.size() > maximumPresetNameBytes || !isUtf8(name) || hasControlCharacter(name)) {

@@ -108,6 +108,9 @@ class Camera {
     /** On: goes to what is sharp and stays there. Off: stays where it is. */
     void setAutomaticFocus(bool automatic);
 
+    /** True for "1" to "64", written as people do. */
+    [[nodiscard]] static bool isPresetToken(const std::string& token);
+
     /** Keeps the present position under a token "1" to "64"; replaces one that is there. An empty name leaves that of a
      *  preset that is there, or makes "Preset N". False: no such token, or the name is not UTF-8, too long or
      *  another's. */

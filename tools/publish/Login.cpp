@@ -132,9 +132,9 @@ HttpLogin::Verdict HttpLogin::check(const HttpRequest& request) {
     const std::string expected =
         md5(md5(m_login.user + ":" + loginRealm + ":" + m_login.password) + ":" + nonce + ":" + count + ":" +
             parameter(said, "cnonce") + ":auth:" + md5(request.sentMethod + ":" + uri));
-    const bool right = equalInConstantTime(parameter(said, "response"), expected) &
-                       equalInConstantTime(parameter(said, "username"), m_login.user) &
-                       static_cast<int>(parameter(said, "qop") == "auth" && withoutHost(uri) == target);
+    const bool rightResponse = equalInConstantTime(parameter(said, "response"), expected);
+    const bool rightUser = equalInConstantTime(parameter(said, "username"), m_login.user);
+    const bool right = rightResponse && rightUser && parameter(said, "qop") == "auth" && withoutHost(uri) == target;
     if (!right) {
         return Verdict::refused;
     }

@@ -135,6 +135,10 @@ std::string Publisher::start() {
         return problem;
     }
     m_host = m_options.loopbackOnly ? "127.0.0.1" : reachableAddress();
+    // Before the addresses are told: who has read them may look for cameras and find them.
+    if (const std::string problem = m_onvif ? m_onvif->announce(m_options.loopbackOnly) : ""; !problem.empty()) {
+        say(problem + "; they can be steered all the same");
+    }
     printAddresses();
     announce();
     return {};
@@ -265,9 +269,6 @@ void Publisher::announce() {
                                               m_options.loopbackOnly, say);
     if (const std::string problem = m_announcer->start(); !problem.empty()) {
         say(problem + "; the addresses above are served all the same");
-    }
-    if (const std::string problem = m_onvif ? m_onvif->announce(m_options.loopbackOnly) : ""; !problem.empty()) {
-        say(problem + "; they can be steered all the same");
     }
 }
 

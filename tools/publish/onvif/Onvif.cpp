@@ -121,7 +121,8 @@ OnvifAnswer OnvifDevice::answer(const std::string& text, const OnvifPlace& place
     const auto& request = std::get<SoapRequest>(parsed);
     const Found found = operationFor(request.operation);
     const bool open = found.operation != nullptr && found.operation->open;
-    if (m_tokens && !open && !authenticated && !m_tokens->accepts(request.header)) {
+    const bool question = request.operation.name().substr(0, 3) == "Get";
+    if (m_tokens && !open && !authenticated && !m_tokens->accepts(request.header, question)) {
         const bool tried = static_cast<bool>(request.header.child("Security"));
         return {tried ? 400 : 401,
                 soapFaultEnvelope({"Sender", {"NotAuthorized"}, "Sender not authorized: a login is needed."}), !tried};

@@ -221,15 +221,6 @@ SoapFault noPreset() {
     return invalidArgument("NoToken", "There is no preset of this token.");
 }
 
-bool hasPreset(const Camera& camera, const std::string& token) {
-    for (const auto& [number, preset] : camera.presets()) {
-        if (std::to_string(number) == token) {
-            return true;
-        }
-    }
-    return false;
-}
-
 bool nameTaken(const Camera& camera, const std::string& name, const std::string& token) {
     for (const auto& [number, preset] : camera.presets()) {
         if (preset.name == name && std::to_string(number) != token) {
@@ -246,7 +237,8 @@ OnvifResult setPreset(const OnvifCall& call) {
     Camera& camera = *call.camera.camera;
     const std::string name = call.operation.child("PresetName").text();
     std::string token = call.operation.child("PresetToken").text();
-    if (!token.empty() && !hasPreset(camera, token)) {
+    // A token that no preset has yet makes one: there are clients that number their presets themselves.
+    if (!token.empty() && !Camera::isPresetToken(token)) {
         return noPreset();
     }
     if (!name.empty() && nameTaken(camera, name, token)) {

@@ -2,7 +2,6 @@
 
 #include "tools/publish/Handles.h"
 
-#include <algorithm>
 #include <array>
 #include <glib.h>
 #include <optional>
@@ -47,15 +46,6 @@ std::optional<UsernameTokens::Time> timeIn(const std::string& text) {
     return UsernameTokens::Time(std::chrono::seconds(g_date_time_to_unix(time.get())));
 }
 
-// In a time that does not tell how much was right.
-bool sameText(const std::string& one, const std::string& other) {
-    unsigned difference = one.size() == other.size() ? 0 : 1;
-    for (std::size_t i = 0; i < std::min(one.size(), other.size()); ++i) {
-        difference |= static_cast<unsigned char>(one[i] ^ other[i]);
-    }
-    return difference == 0;
-}
-
 } // namespace
 
 std::string passwordDigest(const std::string& nonce, const std::string& created, const std::string& password) {
@@ -71,10 +61,9 @@ std::string passwordDigest(const std::string& nonce, const std::string& created,
     return text.get();
 }
 
-UsernameTokens::UsernameTokens(std::string user, std::string password, Clock clock)
-    : m_user(std::move(user)), m_password(std::move(password)), m_clock(std::move(clock)) {}
+UsernameTokens::UsernameTokens(Login login, Clock clock) : m_login(std::move(login)), m_clock(std::move(clock)) {}
 
-bool UsernameTokens::accepts(XmlElement header) {
+bool UsernameTokens::accepts(XmlElement header, bool question) {
     const XmlElement token = header.child("Security").child("UsernameToken");
     const XmlElement password = token.child("Password");
     const std::string created = token.child("Created").text();
@@ -83,22 +72,23 @@ bool UsernameTokens::accepts(XmlElement header) {
     if (!nonce || !time || password.attribute("Type").value_or("") != digestType) {
         return false;
     }
-    const bool right = sameText(token.child("Username").text(), m_user) &&
-                       sameText(password.text(), passwordDigest(*nonce, created, m_password));
-    return right && remember(*nonce, *time);
+    const bool right = equalInConstantTime(token.child("Username").text(), m_login.user) &&
+                       equalInConstantTime(password.text(), passwordDigest(*nonce, created, m_login.password));
+    return right && mayBeUsed(created + '\n' + *nonce, *time, question);
 }
 
-bool UsernameTokens::remember(const std::string& nonce, Time created) {
+bool UsernameTokens::mayBeUsed(const std::string& token, Time created, bool question) {
     const Time now = m_clock();
     if (created < now - tolerance || created > now + tolerance) {
         return false;
     }
     m_seen.erase(m_seen.begin(), m_seen.lower_bound({now - tolerance, {}}));
-    const bool fresh = m_seen.emplace(created, nonce).second;
-    if (m_seen.size() > maximumNonces) {
+    const auto [first, fresh] = m_seen.emplace(std::pair(created, token), now);
+    const bool allowed = fresh || (question && now >= first->second && now - first->second <= repetition);
+    if (m_seen.size() > maximumTokens) {
         m_seen.erase(m_seen.begin());
     }
-    return fresh;
+    return allowed;
 }
 
 } // namespace qivo

@@ -1,17 +1,19 @@
 #pragma once
 
+#include "tools/publish/Login.h"
 #include "tools/publish/onvif/Xml.h"
 
 #include <chrono>
 #include <functional>
-#include <set>
+#include <map>
 #include <string>
 #include <utility>
 
 namespace qivo {
 
 /** Judges the WS-Security UsernameToken of requests by one login. Only digests count: a password in the clear is
- * refused like a wrong one. A nonce is good once with its time stamp, which the digest binds to it.
+ * refused like a wrong one. A token, known by its nonce and time stamp, is good once; for questions, which change
+ * nothing, a moment longer, since there are clients that ask several things with the same.
  *
  *  Thread: one. */
 class UsernameTokens {
@@ -22,21 +24,23 @@ class UsernameTokens {
     /** How far a client's clock may be off. */
     static constexpr std::chrono::seconds tolerance{300};
 
-    /** The oldest nonces are forgotten beyond so many. Only who knows the password adds any. */
-    static constexpr std::size_t maximumNonces = 65536;
+    /** How long after its first use a token is good for further questions. */
+    static constexpr std::chrono::seconds repetition{1};
 
-    UsernameTokens(std::string user, std::string password, Clock clock = std::chrono::system_clock::now);
+    /** The oldest tokens are forgotten beyond so many. Only who knows the password adds any. */
+    static constexpr std::size_t maximumTokens = 65536;
 
-    /** True if the header of a request, which may be nothing, holds a good token that was not seen before. */
-    [[nodiscard]] bool accepts(XmlElement header);
+    explicit UsernameTokens(Login login, Clock clock = std::chrono::system_clock::now);
+
+    /** True if the header of a request, which may be nothing, holds a good token. `question`: it changes nothing. */
+    [[nodiscard]] bool accepts(XmlElement header, bool question);
 
   private:
-    [[nodiscard]] bool remember(const std::string& nonce, Time created);
+    [[nodiscard]] bool mayBeUsed(const std::string& token, Time created, bool question);
 
-    std::string m_user;
-    std::string m_password;
+    Login m_login;
     Clock m_clock;
-    std::set<std::pair<Time, std::string>> m_seen; // time stamps, each with its nonce
+    std::map<std::pair<Time, std::string>, Time> m_seen; // tokens by time stamp; when they first came
 };
 
 /** What a client puts into a token: Base64 of the SHA-1 of nonce, time stamp and password. */

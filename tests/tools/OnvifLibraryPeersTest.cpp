@@ -1,0 +1,74 @@
+#include "tests/tools/Publisher.h"
+
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <cstring>
+#include <memory>
+#include <onvif.h>
+#include <string>
+#include <thread>
+
+// The library beneath onvif-util, whose commands steer nothing: what it is asked here is what its window does.
+namespace qivo::test {
+namespace {
+
+using namespace std::chrono_literals;
+
+struct Session {
+    Session() { initializeSession(session.get()); }
+    ~Session() { closeSession(session.get()); }
+    Session(const Session&) = delete;
+    Session& operator=(const Session&) = delete;
+
+    std::unique_ptr<OnvifSession> session = std::make_unique<OnvifSession>();
+    std::unique_ptr<OnvifData> camera = std::make_unique<OnvifData>();
+};
+
+class OnvifLibraryPeers : public testing::Test {
+  protected:
+    // Finds the camera and learns its addresses and its profile.
+    void find(const char* user, const char* password) {
+        ASSERT_EQ(broadcast(m_session.session.get()), 1);
+        prepareOnvifData(0, m_session.session.get(), m_camera);
+        std::strcpy(m_camera->username, user);
+        std::strcpy(m_camera->password, password);
+        ASSERT_EQ(getTimeOffset(m_camera), 0) << m_camera->last_error;
+        ASSERT_EQ(getCapabilities(m_camera), 0) << m_camera->last_error;
+        ASSERT_EQ(fillRTSPn(m_camera, 0), 0) << m_camera->last_error;
+    }
+
+    // A library's function, which takes text that it does not change.
+    int preset(int (*function)(char*, OnvifData*), const char* token) {
+        std::string text = token;
+        return function(text.data(), m_camera);
+    }
+
+    Session m_session;
+    OnvifData* m_camera = m_session.camera.get();
+};
+
+TEST_F(OnvifLibraryPeers, findsReadsMovesStopsAndRecalls) {
+    const PublishProcess publisher({"--machine", "STUDIO", "--ptz"}, 4);
+    ASSERT_NO_FATAL_FAILURE(find("admin", "x"));
+    EXPECT_EQ(m_camera->stream_uri, publisher.address(0));
+    EXPECT_STREQ(m_camera->profileToken, "full");
+    EXPECT_EQ(preset(setPreset, "3"), 0) << m_camera->last_error;
+    EXPECT_EQ(continuousMove(0.5F, 0.25F, 0.1F, m_camera), 0) << m_camera->last_error;
+    EXPECT_EQ(moveStop(PAN_TILT_STOP, m_camera), 0) << m_camera->last_error;
+    EXPECT_EQ(moveStop(ZOOM_STOP, m_camera), 0) << m_camera->last_error;
+    EXPECT_EQ(preset(gotoPreset, "3"), 0) << m_camera->last_error;
+    EXPECT_NE(preset(gotoPreset, "4"), 0);
+    EXPECT_STREQ(m_camera->last_error, "ter:InvalidArgVal");
+}
+
+TEST_F(OnvifLibraryPeers, steersWithALoginAndNotWithAWrongOne) {
+    const PublishProcess publisher({"--machine", "STUDIO", "--ptz", "--login", "admin:secret"}, 4);
+    ASSERT_NO_FATAL_FAILURE(find("admin", "secret"));
+    EXPECT_EQ(continuousMove(0.5F, 0, 0, m_camera), 0) << m_camera->last_error;
+    std::strcpy(m_camera->password, "wrong");
+    EXPECT_NE(moveStop(PAN_TILT_STOP, m_camera), 0);
+}
+
+} // namespace
+} // namespace qivo::test
