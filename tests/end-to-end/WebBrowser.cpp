@@ -108,13 +108,15 @@ std::string WebBrowser::text(const std::string& selector) {
 }
 
 CanvasPicture WebBrowser::canvas(const std::string& selector) {
-    // As text of which each character is a byte: an array would be many times as large.
-    const QJsonValue seen = run("const canvas = document.querySelector('" + selector +
-                                "'); const {width, height} = canvas; let text = '';"
-                                "const bytes = canvas.getContext('2d').getImageData(0, 0, width, height).data;"
+    // Small, and as text of which each character is a byte: a large array takes so long that a camera is at its end.
+    const QJsonValue seen = run("const shown = document.querySelector('" + selector +
+                                "'); const canvas = new OffscreenCanvas(320, 180);"
+                                "const context = canvas.getContext('2d', {willReadFrequently: true});"
+                                "context.imageSmoothingQuality = 'medium'; context.drawImage(shown, 0, 0, 320, 180);"
+                                "const bytes = context.getImageData(0, 0, 320, 180).data; let text = '';"
                                 "for (let i = 0; i < bytes.length; i += 8192)"
                                 "  text += String.fromCharCode(...bytes.subarray(i, i + 8192));"
-                                "return {width, height, pixels: btoa(text)};");
+                                "return {width: 320, height: 180, pixels: btoa(text)};");
     const QByteArray bytes = QByteArray::fromBase64(seen["pixels"].toString().toLatin1());
     return {seen["width"].toInt(), seen["height"].toInt(), {bytes.begin(), bytes.end()}};
 }
@@ -150,8 +152,9 @@ void WebBrowser::releaseAll() {
 }
 
 void WebBrowser::click(const std::string& selector) {
-    press(selector);
-    point({QJsonObject{{"type", "pointerUp"}, {"button", 0}}});
+    point({QJsonObject{{"type", "pointerMove"}, {"origin", find(selector)}, {"x", 0}, {"y", 0}, {"duration", 0}},
+           QJsonObject{{"type", "pointerDown"}, {"button", 0}}, QJsonObject{{"type", "pause"}, {"duration", 40}},
+           QJsonObject{{"type", "pointerUp"}, {"button", 0}}});
 }
 
 void WebBrowser::holdKey(const std::string& key) {

@@ -12,7 +12,7 @@
 
 namespace qivo::test {
 
-/// What a page's canvas shows: RGBA without padding; empty if it could not be read.
+/// What a page's canvas shows, scaled to 320 x 180: RGBA without padding; empty if it could not be read.
 struct CanvasPicture {
     int width = 0;
     int height = 0;

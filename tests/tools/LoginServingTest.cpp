@@ -30,7 +30,7 @@ class LoginServing : public testing::Test {
     }
     std::string post(const std::string& xml, const std::string& authorization = {}) const {
         return ask(portOf(m_publisher.address(2)),
-                   jsonPost("/source-1/onvif/media_service", xml,
+                   jsonPost("/source-1/onvif/media", xml,
                             "Host: 127.0.0.1\r\nContent-Type: application/soap+xml\r\n" + authorization));
     }
 
@@ -60,7 +60,7 @@ TEST_F(LoginServing, onvifTakesHttpDigest) {
     DigestAnswer answer;
     answer.nonce = nonceIn(refused);
     answer.method = "POST";
-    answer.uri = "/source-1/onvif/media_service";
+    answer.uri = "/source-1/onvif/media";
     const std::string accepted = post(profiles, "Authorization: " + answer.header() + "\r\n");
     EXPECT_EQ(statusOf(accepted), 200);
     EXPECT_THAT(accepted, HasSubstr("GetProfilesResponse"));

@@ -70,7 +70,7 @@ struct Options {
     int port = -1;     ///< 0 for any free one, -1 for preferredPort or, where that is busy, any free one
     int httpPort = -1; ///< for steering; the same with preferredHttpPort
     bool loopbackOnly = false;
-    std::optional<Login> login;         ///< needed for streams and steering
+    std::optional<Login> login = {};    ///< needed for streams and steering
     std::vector<SourceOptions> sources; ///< at least one
 };
 
