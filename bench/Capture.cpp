@@ -3,6 +3,7 @@
 //
 //   bench-capture [ROUNDS]
 #include "app/AppData.h"
+#include "bench/Timing.h"
 #include "platform/FairLock.h"
 #include "tests/gl/EglContext.h"
 #include "video/VideoView.h"
@@ -10,7 +11,6 @@
 #include <QApplication>
 #include <algorithm>
 #include <array>
-#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -61,7 +61,6 @@ bool QIVOlib_recv_ptz_is_supported(QIVOlib_recv_instance_t /*instance*/) {
 namespace {
 
 using qivo::EglContext;
-using Clock = std::chrono::steady_clock;
 
 class WindowlessContext final : public qivo::GLContext {
   public:
@@ -95,17 +94,6 @@ class UnlinkedView final : public qivo::VideoView {
   protected:
     std::unique_ptr<qivo::DisplayLink> newDisplayLink() override { return nullptr; }
 };
-
-double microseconds(const std::function<void()>& work) {
-    const auto begin = Clock::now();
-    work();
-    return std::chrono::duration<double, std::micro>(Clock::now() - begin).count();
-}
-
-double median(std::vector<double> values) {
-    std::sort(values.begin(), values.end());
-    return values[values.size() / 2];
-}
 
 void report(const char* what, const std::vector<double>& pass, const std::vector<double>& copy) {
     const double ratio = median(pass) / median(copy);

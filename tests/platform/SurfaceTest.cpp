@@ -11,6 +11,7 @@
 #include <fcntl.h>
 #include <limits>
 #include <sys/mman.h>
+#include <thread>
 #include <unistd.h>
 
 namespace qivo {
@@ -187,6 +188,27 @@ TEST(Surface, LocksExcludeNobodyAndAreGivenBackOneByOne) {
         EXPECT_EQ(IOSurfaceUnlock(surface.get(), kIOSurfaceLockReadOnly, nullptr), kIOReturnSuccess);
     }
     EXPECT_EQ(IOSurfaceUnlock(surface.get(), kIOSurfaceLockReadOnly, nullptr), kIOReturnNotPermitted);
+}
+
+TEST(Surface, ThreadsMayLockAtOnceAndEveryLockCounts) {
+    constexpr unsigned turns = 1000;
+    const auto surface = IOSurfaceCreate(smallProperties());
+    ASSERT_TRUE(surface);
+    std::vector<std::thread> threads;
+    for (int count = 0; count < 4; ++count) {
+        threads.emplace_back([&] {
+            for (unsigned turn = 0; turn < turns; ++turn) {
+                const std::uint32_t options = turn % 2 * kIOSurfaceLockReadOnly;
+                IOSurfaceLock(surface.get(), options, nullptr);
+                IOSurfaceUnlock(surface.get(), options, nullptr);
+            }
+        });
+    }
+    for (auto& thread : threads) {
+        thread.join();
+    }
+    EXPECT_EQ(IOSurfaceGetSeed(surface.get()), 4 * turns) << "half of the turns, each with two changes";
+    EXPECT_EQ(IOSurfaceUnlock(surface.get(), 0, nullptr), kIOReturnNotPermitted) << "none is left over";
 }
 
 TEST(Surface, RefusesOptionsThatItDoesNotKnow) {
