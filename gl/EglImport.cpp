@@ -162,7 +162,7 @@ bool tryOut(EGLDisplay display) {
 }
 
 EGLImageKHR imageOf(EGLDisplay display, IOSurfaceRef surface, std::uint32_t plane) {
-    const Descriptor buffer = IOSurfaceCreateDmaBuf(surface);
+    const FileDescriptor buffer = IOSurfaceCreateDmaBuf(surface);
     if (!buffer) {
         return EGL_NO_IMAGE_KHR;
     }

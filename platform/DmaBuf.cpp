@@ -13,23 +13,23 @@ namespace {
 
 DmaBufMaker otherMaker;
 
-Descriptor madeBySystem(IOSurfaceRef surface) {
-    const Descriptor device(::open("/dev/udmabuf", O_RDWR | O_CLOEXEC));
+FileDescriptor madeBySystem(IOSurfaceRef surface) {
+    const FileDescriptor device(::open("/dev/udmabuf", O_RDWR | O_CLOEXEC));
     if (!device) {
-        return Descriptor();
+        return FileDescriptor();
     }
     udmabuf_create request{};
     request.memfd = static_cast<std::uint32_t>(IOSurfaceGetDescriptor(surface));
     request.flags = UDMABUF_FLAGS_CLOEXEC;
     request.size = IOSurface::pixelBytes(surface->layout());
-    return Descriptor(::ioctl(device.number(), UDMABUF_CREATE, &request));
+    return FileDescriptor(::ioctl(device.number(), UDMABUF_CREATE, &request));
 }
 
 } // namespace
 
-Descriptor IOSurfaceCreateDmaBuf(IOSurfaceRef surface) {
+FileDescriptor IOSurfaceCreateDmaBuf(IOSurfaceRef surface) {
     if (!surface) {
-        return Descriptor();
+        return FileDescriptor();
     }
     return otherMaker ? otherMaker(surface) : madeBySystem(surface);
 }

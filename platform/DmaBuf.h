@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/Descriptor.h"
+#include "platform/FileDescriptor.h"
 #include "platform/Surface.h"
 
 #include <functional>
@@ -11,12 +11,12 @@ namespace qivo {
 /// system cannot make one of memory, as without its udmabuf device or the right to use it.
 ///
 /// Thread: any.
-Descriptor IOSurfaceCreateDmaBuf(IOSurfaceRef surface);
+FileDescriptor IOSurfaceCreateDmaBuf(IOSurfaceRef surface);
 
 /// What makes such buffers in place of the system, or the system again if empty.
 ///
 /// Thread: any, but not while buffers are made.
-using DmaBufMaker = std::function<Descriptor(IOSurfaceRef)>;
+using DmaBufMaker = std::function<FileDescriptor(IOSurfaceRef)>;
 void setDmaBufMaker(DmaBufMaker maker);
 
 } // namespace qivo

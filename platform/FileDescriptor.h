@@ -23,6 +23,7 @@ class FileDescriptor {
 
     int number() const { return m_number; }
     bool isOpen() const { return m_number >= 0; }
+    explicit operator bool() const { return isOpen(); }
 
     /// Closes it now.
     void reset() {

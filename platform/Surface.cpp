@@ -38,19 +38,19 @@ std::optional<SurfaceLayout> layoutOf(const IOSurfaceProperties& properties,
 }
 
 /// A file without a name. Newer systems may insist that it can not be executed, older ones do not know how to say so.
-Descriptor unnamedFile() {
+FileDescriptor unnamedFile() {
     constexpr unsigned notExecutable = 0x8;
     constexpr unsigned flags = MFD_CLOEXEC | MFD_ALLOW_SEALING;
-    Descriptor file(::memfd_create("qivo-surface", flags | notExecutable));
-    return file ? std::move(file) : Descriptor(::memfd_create("qivo-surface", flags));
+    FileDescriptor file(::memfd_create("qivo-surface", flags | notExecutable));
+    return file ? std::move(file) : FileDescriptor(::memfd_create("qivo-surface", flags));
 }
 
 /// One of this size, which it keeps; none if there is none to be had.
-Descriptor sealedFile(std::size_t bytes) {
-    Descriptor file = unnamedFile();
+FileDescriptor sealedFile(std::size_t bytes) {
+    FileDescriptor file = unnamedFile();
     const bool done = file && ::ftruncate(file.number(), static_cast<off_t>(bytes)) == 0 &&
                       ::fcntl(file.number(), F_ADD_SEALS, IOSurface::seals) == 0;
-    return done ? std::move(file) : Descriptor();
+    return done ? std::move(file) : FileDescriptor();
 }
 
 const IOSurfacePlane* planeOf(IOSurfaceRef surface, std::uint64_t index) {
@@ -66,7 +66,7 @@ std::shared_ptr<IOSurface> IOSurfaceCreate(const IOSurfaceProperties& properties
         return nullptr;
     }
     const std::size_t bytes = IOSurface::fileBytes(*layout);
-    Descriptor file = sealedFile(bytes);
+    FileDescriptor file = sealedFile(bytes);
     if (!file) {
         return nullptr;
     }

@@ -18,7 +18,7 @@ std::uint64_t pageBytes() {
 
 } // namespace
 
-SharedMapping::SharedMapping(const Descriptor& file, std::size_t bytes, bool writable) : _bytes(bytes) {
+SharedMapping::SharedMapping(const FileDescriptor& file, std::size_t bytes, bool writable) : _bytes(bytes) {
     void* memory = ::mmap(nullptr, bytes, PROT_READ | (writable ? PROT_WRITE : 0), MAP_SHARED, file.number(), 0);
     _memory = memory == MAP_FAILED ? nullptr : static_cast<std::byte*>(memory);
 }
@@ -47,7 +47,7 @@ std::size_t IOSurface::fileBytes(const SurfaceLayout& layout) {
     return pixelBytes(layout) + pageBytes();
 }
 
-IOSurface::IOSurface(const SurfaceLayout& layout, Descriptor file, SharedMapping mapping, bool writable)
+IOSurface::IOSurface(const SurfaceLayout& layout, FileDescriptor file, SharedMapping mapping, bool writable)
     : _layout(layout), _file(std::move(file)), _mapping(std::move(mapping)), _writable(writable) {}
 
 std::atomic<std::uint32_t>& IOSurface::sharedSeed() const {

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/Descriptor.h"
+#include "platform/FileDescriptor.h"
 #include "platform/Surface.h"
 
 #include <atomic>
@@ -14,7 +14,7 @@ class SharedMapping {
   public:
     SharedMapping() = default;
     /// Null memory if the file cannot be mapped, in errno.
-    SharedMapping(const Descriptor& file, std::size_t bytes, bool writable);
+    SharedMapping(const FileDescriptor& file, std::size_t bytes, bool writable);
     ~SharedMapping();
     SharedMapping(SharedMapping&& other) noexcept;
     SharedMapping(const SharedMapping&) = delete;
@@ -39,10 +39,10 @@ class IOSurface {
     static std::size_t fileBytes(const SurfaceLayout& layout);
 
     /// The layout must be sound, and the mapping as large as it asks for.
-    IOSurface(const SurfaceLayout& layout, Descriptor file, SharedMapping mapping, bool writable);
+    IOSurface(const SurfaceLayout& layout, FileDescriptor file, SharedMapping mapping, bool writable);
 
     const SurfaceLayout& layout() const { return _layout; }
-    const Descriptor& file() const { return _file; }
+    const FileDescriptor& file() const { return _file; }
     std::byte* base() const { return _mapping.memory(); }
     std::uint32_t seed() const;
 
@@ -54,7 +54,7 @@ class IOSurface {
     void changeSeed();
 
     const SurfaceLayout _layout;
-    const Descriptor _file;
+    const FileDescriptor _file;
     const SharedMapping _mapping;
     const bool _writable;
 

@@ -42,9 +42,9 @@ std::string systemError(const char* what) {
 }
 
 /// The file opened once more for reading alone: what a descriptor permits goes with it.
-Descriptor readOnly(const Descriptor& file) {
+FileDescriptor readOnly(const FileDescriptor& file) {
     const std::string path = "/proc/self/fd/" + std::to_string(file.number());
-    return Descriptor(::open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    return FileDescriptor(::open(path.c_str(), O_RDONLY | O_CLOEXEC));
 }
 
 bool sendMessage(int socket, Message& message, int descriptor) {
@@ -64,18 +64,18 @@ bool sendMessage(int socket, Message& message, int descriptor) {
 }
 
 /// The one descriptor of a message. The system itself drops those that there is no room for.
-Descriptor descriptorIn(msghdr& received) {
+FileDescriptor descriptorIn(msghdr& received) {
     const cmsghdr* control = CMSG_FIRSTHDR(&received);
     int descriptor = -1;
     if (control && control->cmsg_level == SOL_SOCKET && control->cmsg_type == SCM_RIGHTS &&
         control->cmsg_len == CMSG_LEN(sizeof descriptor)) {
         std::memcpy(&descriptor, CMSG_DATA(control), sizeof descriptor);
     }
-    return Descriptor(descriptor);
+    return FileDescriptor(descriptor);
 }
 
 /// The message and its descriptor; no descriptor, and why not, if what arrived is anything else.
-Descriptor receiveMessage(int socket, Message& message, std::string& error) {
+FileDescriptor receiveMessage(int socket, Message& message, std::string& error) {
     iovec content{&message, sizeof message};
     Ancillary ancillary;
     msghdr received = header(content, ancillary);
@@ -85,21 +85,21 @@ Descriptor receiveMessage(int socket, Message& message, std::string& error) {
     } while (count < 0 && errno == EINTR);
     if (count < 0) {
         error = systemError("Receiving a surface");
-        return Descriptor();
+        return FileDescriptor();
     }
-    Descriptor file = descriptorIn(received);
+    FileDescriptor file = descriptorIn(received);
     const bool whole =
         count == static_cast<ssize_t>(sizeof message) && !(received.msg_flags & (MSG_TRUNC | MSG_CTRUNC));
     if (!file || !whole || message.mark != Message().mark) {
         error = count == 0 ? "The connection has ended" : "What was received is no surface";
-        return Descriptor();
+        return FileDescriptor();
     }
     return file;
 }
 
 /// Why the memory is not what a surface of this layout needs; empty if it is. Only ordinary shared memory will do: of
 /// huge pages, for one, its owner can take some back, seals or no seals.
-std::string objection(const Descriptor& file, const SurfaceLayout& layout) {
+std::string objection(const FileDescriptor& file, const SurfaceLayout& layout) {
     if (!isSound(layout, IOSurface::maximumBytes())) {
         return "The sizes of the surface that was received do not fit each other or this machine";
     }
@@ -128,7 +128,7 @@ bool IOSurfaceSend(int socket, IOSurfaceRef surface, SurfaceAccess access, std::
         error = "There is no surface to send";
         return false;
     }
-    const Descriptor restricted = access == SurfaceAccess::readOnly ? readOnly(surface->file()) : Descriptor();
+    const FileDescriptor restricted = access == SurfaceAccess::readOnly ? readOnly(surface->file()) : FileDescriptor();
     if (access == SurfaceAccess::readOnly && !restricted) {
         error = systemError("Opening the surface for reading");
         return false;
@@ -144,7 +144,7 @@ bool IOSurfaceSend(int socket, IOSurfaceRef surface, SurfaceAccess access, std::
 
 std::shared_ptr<IOSurface> IOSurfaceReceive(int socket, std::string& error) {
     Message message;
-    Descriptor file = receiveMessage(socket, message, error);
+    FileDescriptor file = receiveMessage(socket, message, error);
     if (!file) {
         return nullptr;
     }

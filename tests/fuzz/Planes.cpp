@@ -122,7 +122,7 @@ void receive(Numbers& numbers) {
     for (auto& plane : message.layout.planes) {
         plane = planeOf(numbers);
     }
-    const Descriptor memory(::memfd_create("surface", MFD_ALLOW_SEALING));
+    const FileDescriptor memory(::memfd_create("surface", MFD_ALLOW_SEALING));
     const std::uint64_t pages = 1 + numbers.byte();
     if (!isSmall(message.layout.allocSize) || ::ftruncate(memory.number(), static_cast<off_t>(pages * 4096)) != 0) {
         return;

@@ -107,7 +107,7 @@ ImportingDriver::ImportingDriver(Kind kind) : _kind(kind) {
                 realReadPixels(x, y, width, height, format, type, pixels);
             });
     // As the system would make it of memory.
-    setDmaBufMaker([](IOSurfaceRef surface) { return Descriptor(::dup(IOSurfaceGetDescriptor(surface))); });
+    setDmaBufMaker([](IOSurfaceRef surface) { return FileDescriptor(::dup(IOSurfaceGetDescriptor(surface))); });
 }
 
 ImportingDriver::~ImportingDriver() {

@@ -84,7 +84,7 @@ TEST_F(SurfaceContextTest, CurrentContextIsTheOneOfEgl) {
 
 TEST_F(SurfaceContextTest, TextureShowsTheSurfaceAndIsBroughtUpToDateByUpdates) {
     // The driver of this machine may be one that can do without the copy.
-    setDmaBufMaker([](IOSurfaceRef) { return Descriptor(); });
+    setDmaBufMaker([](IOSurfaceRef) { return FileDescriptor(); });
     const auto surface = acquired(32, 2, 2);
     auto pixels = countingFrom(0, 16);
     surface->update(pixels.data());
@@ -105,7 +105,7 @@ TEST_F(SurfaceContextTest, TextureShowsTheSurfaceAndIsBroughtUpToDateByUpdates) 
 }
 
 TEST_F(SurfaceContextTest, SixteenBitComponentsAreThoseOfTheMachine) {
-    setDmaBufMaker([](IOSurfaceRef) { return Descriptor(); });
+    setDmaBufMaker([](IOSurfaceRef) { return FileDescriptor(); });
     const auto surface = acquired(64, 3, 1);
     const std::vector<std::uint16_t> pixels = {1, 2, 3, 4, 0x1234, 0x5678, 0x9ABC, 0xDEF0, 9, 10, 11, 12};
     surface->update(pixels.data());
@@ -211,7 +211,7 @@ TEST_F(SurfaceImportTest, DriversThatDoNotStandTheTrialAreDeclined) {
 
 TEST_F(SurfaceImportTest, SystemWithoutBuffersForDevicesIsDeclined) {
     ImportingDriver driver(ImportingDriver::Kind::follows);
-    setDmaBufMaker([](IOSurfaceRef) { return Descriptor(); });
+    setDmaBufMaker([](IOSurfaceRef) { return FileDescriptor(); });
     const auto texture = GLTexture::initWithSurface(surface.get());
     expectFallBack(kCGLUnsupported);
     expectOnlyTheErrorOfEnabling();
@@ -233,8 +233,8 @@ TEST_F(SurfaceImportTest, SurfaceThatTheDriverRefusesIsCopied) {
 
 TEST_F(SurfaceContextTest, SystemMakesBuffersOfSurfacesOrSaysThatItCannot) {
     const auto surface = acquired(32, 64, 64);
-    const Descriptor buffer = IOSurfaceCreateDmaBuf(surface->surface());
-    const bool canTry = Descriptor(::open("/dev/udmabuf", O_RDWR | O_CLOEXEC)).number() >= 0;
+    const FileDescriptor buffer = IOSurfaceCreateDmaBuf(surface->surface());
+    const bool canTry = FileDescriptor(::open("/dev/udmabuf", O_RDWR | O_CLOEXEC)).number() >= 0;
     EXPECT_EQ(static_cast<bool>(buffer), canTry);
     EXPECT_FALSE(IOSurfaceCreateDmaBuf(nullptr));
 }
@@ -248,7 +248,7 @@ class SurfaceProcessTest : public SurfaceContextTest {
 
     void SetUp() override {
         SurfaceContextTest::SetUp();
-        setDmaBufMaker([](IOSurfaceRef) { return Descriptor(); });
+        setDmaBufMaker([](IOSurfaceRef) { return FileDescriptor(); });
     }
 
     /// Starts the writer, at the other end of the socket.

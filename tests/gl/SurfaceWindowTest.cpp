@@ -43,7 +43,7 @@ TEST_P(SurfaceWindowTest, ContextOfTheWindowSystemIsFoundAndShowsTheSurface) {
     ASSERT_TRUE(surface.acquire());
     const std::vector<std::uint8_t> pixels = {1, 2, 3, 4, 5, 6, 7, 8};
     ASSERT_TRUE(surface.update(pixels.data()));
-    setDmaBufMaker([](IOSurfaceRef) { return Descriptor(); });
+    setDmaBufMaker([](IOSurfaceRef) { return FileDescriptor(); });
     LogCapture log;
     const auto texture = GLTexture::initWithSurface(&surface);
     const int error = std::string(GetParam()) == "xcb_glx" ? kCGLBadContext : kCGLUnsupported;

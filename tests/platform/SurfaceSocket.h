@@ -1,6 +1,6 @@
 #pragma once
 
-#include "platform/Descriptor.h"
+#include "platform/FileDescriptor.h"
 #include "platform/SurfaceLayout.h"
 
 #include <array>
@@ -27,8 +27,8 @@ class SurfaceSocket {
         if (::socketpair(AF_UNIX, type, 0, ends.data()) != 0) {
             throw std::runtime_error("cannot make a socket");
         }
-        _here = Descriptor(ends[0]);
-        _there = Descriptor(ends[1]);
+        _here = FileDescriptor(ends[0]);
+        _there = FileDescriptor(ends[1]);
     }
 
     int here() const { return _here.number(); }
@@ -59,10 +59,10 @@ class SurfaceSocket {
     }
 
   private:
-    static Descriptor close(Descriptor) { return Descriptor(); }
+    static FileDescriptor close(FileDescriptor) { return FileDescriptor(); }
 
-    Descriptor _here;
-    Descriptor _there;
+    FileDescriptor _here;
+    FileDescriptor _there;
 };
 
 } // namespace qivo

@@ -355,8 +355,8 @@ class HostileSurfacePeer : public SurfaceTransfer {
     static constexpr std::size_t soundBytes = 8192;
 
     /// As a surface's file is made, but for what the test wants to be different.
-    static Descriptor file(std::size_t bytes = soundBytes, int seals = IOSurface::seals, unsigned flags = 0) {
-        Descriptor made(::memfd_create("hostile", MFD_ALLOW_SEALING | flags));
+    static FileDescriptor file(std::size_t bytes = soundBytes, int seals = IOSurface::seals, unsigned flags = 0) {
+        FileDescriptor made(::memfd_create("hostile", MFD_ALLOW_SEALING | flags));
         EXPECT_EQ(::ftruncate(made.number(), static_cast<off_t>(bytes)), 0);
         EXPECT_EQ(::fcntl(made.number(), F_ADD_SEALS, seals), 0);
         return made;
@@ -372,7 +372,7 @@ class HostileSurfacePeer : public SurfaceTransfer {
 };
 
 TEST_F(HostileSurfacePeer, IsBelievedWhatItsMemoryProves) {
-    const Descriptor sound = file();
+    const FileDescriptor sound = file();
     socket.send(message, {sound.number()});
     EXPECT_TRUE(IOSurfaceReceive(socket.there(), error)) << error;
 }
@@ -394,13 +394,13 @@ TEST_F(HostileSurfacePeer, WithMemoryOfAnotherSizeIsRefused) {
 
 TEST_F(HostileSurfacePeer, WithAnotherKindOfFileIsRefused) {
     constexpr auto text = "The surface that was received is not shared memory";
-    EXPECT_EQ(answer(Descriptor(::open("/proc/self/exe", O_RDONLY)).number()), text);
-    EXPECT_EQ(answer(Descriptor(::open("/", O_RDONLY)).number()), text);
+    EXPECT_EQ(answer(FileDescriptor(::open("/proc/self/exe", O_RDONLY)).number()), text);
+    EXPECT_EQ(answer(FileDescriptor(::open("/", O_RDONLY)).number()), text);
     EXPECT_EQ(answer(socket.here()), text);
 }
 
 TEST_F(HostileSurfacePeer, WithHugePagesIsRefused) {
-    const Descriptor huge(::memfd_create("hostile", MFD_ALLOW_SEALING | MFD_HUGETLB));
+    const FileDescriptor huge(::memfd_create("hostile", MFD_ALLOW_SEALING | MFD_HUGETLB));
     if (!huge) {
         GTEST_SKIP() << "This system has no huge pages";
     }
@@ -433,7 +433,7 @@ TEST_F(HostileSurfacePeer, WithSizesThatDoNotFitIsRefused) {
 
 TEST_F(HostileSurfacePeer, WithAnythingButOneDescriptorIsRefusedAndLeavesNoneOpen) {
     constexpr auto text = "What was received is no surface";
-    const Descriptor sound = file();
+    const FileDescriptor sound = file();
     const int next = ::dup(sound.number());
     ::close(next);
     for (const auto& descriptors :
@@ -448,7 +448,7 @@ TEST_F(HostileSurfacePeer, WithAnythingButOneDescriptorIsRefusedAndLeavesNoneOpe
 }
 
 TEST_F(HostileSurfacePeer, WithAnotherMarkOrHalfAMessageIsRefused) {
-    const Descriptor sound = file();
+    const FileDescriptor sound = file();
     message.mark.back() = '0';
     EXPECT_EQ(answer(sound.number()), "What was received is no surface");
     message.mark.back() = '1';

@@ -4,6 +4,7 @@ namespace qivo {
 namespace {
 
 constexpr const char* viewerRole = "viewer";
+constexpr guint pictureStream = 0; // of a media, by its payloader's number
 
 void onPlay(GstRTSPClient*, GstRTSPContext* context, gpointer) {
     if (context->media != nullptr) {
@@ -56,7 +57,9 @@ int RtspServer::viewers(const std::string& path) const {
         gint matched = 0;
         GstRTSPSessionMedia* media = gst_rtsp_session_get_media(session, found->path.c_str(), &matched);
         const bool whole = media != nullptr && matched == static_cast<gint>(found->path.size());
-        found->playing += whole && gst_rtsp_session_media_get_rtsp_state(media) == GST_RTSP_STATE_PLAYING ? 1 : 0;
+        const bool playing = whole && gst_rtsp_session_media_get_rtsp_state(media) == GST_RTSP_STATE_PLAYING;
+        // Many a viewer takes the sound in a session of its own; whoever takes no picture is not counted.
+        found->playing += playing && gst_rtsp_session_media_get_transport(media, pictureStream) != nullptr ? 1 : 0;
         return GST_RTSP_FILTER_KEEP;
     };
     g_list_free_full(gst_rtsp_session_pool_filter(sessions.get(), look, &count), g_object_unref);

@@ -20,8 +20,8 @@ class RtspServer {
     /** Lets only those who log in, by digest, see what is mounted from now on. */
     void requireLogin(const Login& login);
 
-    /** Those who play the stream under a path at this moment. One who went without a word is among them until the
-     *  server's time-out, a minute at most. */
+    /** Those who play the picture of the stream under a path at this moment. One who went without a word is among them
+     *  until the server's time-out, a minute at most. */
     [[nodiscard]] int viewers(const std::string& path) const;
 
     /** Serves a stream under a path, which begins with "/". */
