@@ -28,9 +28,11 @@ RecorderProcess::RecorderProcess(const std::string& script, std::string name, co
     mkfifo(pipe.c_str(), 0600);
     m_input = open(pipe.c_str(), O_RDWR | O_CLOEXEC);
     const std::string folder = m_folder.path("movies");
-    m_process = Process::start({"/bin/sh", "-c", "exec <\"$0\"; folder=$1; shift; " + around, pipe, folder, RECORDER,
-                                "-i", m_name, "-o", folder + "/" + m_name + ".mov", "-orvane", "-nothumbnail"},
-                               {"QIVO_STAND_IN=" + script, "LD_LIBRARY_PATH=" + library});
+    m_process =
+        Process::start({"/bin/sh", "-c", "exec <\"$0\"; folder=$1; shift; " + around, pipe, folder, RECORDER, "-i",
+                        m_name, "-o", folder + "/" + m_name + ".mov", "-orvane", "-nothumbnail"},
+                       // The shell would hand on the last of two settings, which is the inherited one.
+                       {"QIVO_STAND_IN=" + script, "LD_LIBRARY_PATH=" + library, "ASAN_OPTIONS=detect_leaks=0"});
 }
 
 RecorderProcess::~RecorderProcess() {
