@@ -32,4 +32,10 @@ struct DecodedMovie {
 
 DecodedMovie decodeMovie(const std::string& path);
 
+/// When the pictures turn white, in seconds.
+std::vector<double> flashes(const DecodedMovie& movie);
+
+/// When sound is heard after at least 0.2 s of silence, in seconds.
+std::vector<double> tones(const DecodedMovie& movie);
+
 } // namespace qivo::test

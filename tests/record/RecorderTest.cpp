@@ -37,33 +37,6 @@ std::vector<std::string> namesIn(const std::string& folder) {
     return names;
 }
 
-/// When the pictures turn white.
-std::vector<double> flashes(const DecodedMovie& movie) {
-    std::vector<double> times;
-    for (std::size_t i = 1; i < movie.pictures.size(); ++i) {
-        if (movie.pictures[i].middle > 200 && movie.pictures[i - 1].middle < 100) {
-            times.push_back(movie.pictures[i].time);
-        }
-    }
-    return times;
-}
-
-/// When the tone is heard after silence.
-std::vector<double> tones(const DecodedMovie& movie) {
-    std::vector<double> times;
-    double loud = -1;
-    for (std::size_t i = 0; i < movie.sound.size(); ++i) {
-        const double time = movie.soundStart + static_cast<double>(i) / movie.rate;
-        if (std::abs(movie.sound[i]) > 0.1F) {
-            if (time - loud > 0.2 && i > 0) {
-                times.push_back(time);
-            }
-            loud = time;
-        }
-    }
-    return times;
-}
-
 /// Each flash has its tone. A movie that begins within one shows neither's beginning.
 void expectTogether(const DecodedMovie& movie, std::size_t least) {
     const auto seen = flashes(movie);

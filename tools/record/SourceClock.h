@@ -2,7 +2,6 @@
 
 #include <chrono>
 #include <cstdint>
-#include <optional>
 
 namespace qivo::record {
 
@@ -28,14 +27,12 @@ class SourceClock {
     void follow(Nanoseconds deviation, Nanoseconds arrival);
     void begin(Nanoseconds stamp, Nanoseconds arrival);
 
-    struct State {
-        Nanoseconds offset{};  ///< from stamps to places
-        Nanoseconds began{};   ///< the arrival that the offset was first taken from
-        Nanoseconds arrival{}; ///< of the last frame
-        Nanoseconds stamp{};   ///< of the last frame
-        Nanoseconds place{};   ///< of the last frame
-    };
-    std::optional<State> m_state; ///< empty before the first frame
+    bool m_begun = false;
+    Nanoseconds m_offset{};  // from stamps to places
+    Nanoseconds m_began{};   // the arrival that the offset was first taken from
+    Nanoseconds m_arrival{}; // of the last frame, as the next two
+    Nanoseconds m_stamp{};
+    Nanoseconds m_place{};
 };
 
 } // namespace qivo::record

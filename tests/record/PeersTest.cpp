@@ -1,0 +1,98 @@
+// Movies of the recorder in the hands of programs that others wrote.
+#include "tests/record/RecorderProcess.h"
+
+#include <cmath>
+#include <csignal>
+#include <cstdlib>
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+namespace qivo::test {
+namespace {
+
+using std::chrono::milliseconds;
+using testing::HasSubstr;
+
+struct Outcome {
+    std::optional<int> code;
+    std::string output;
+};
+
+Outcome shell(const std::string& command) {
+    const auto process = Process::start({"/bin/sh", "-c", command + " 2>&1 </dev/null"});
+    const auto code = process->wait(std::chrono::seconds(40));
+    return {code, process->output()};
+}
+
+/// Some two seconds of a movie, finished or cut off.
+std::string record(RecorderProcess& recorder, bool kill) {
+    EXPECT_TRUE(recorder.waitForLength(milliseconds(1800))) << recorder.process().errors();
+    if (kill) {
+        recorder.process().signal(SIGKILL);
+        recorder.process().wait(std::chrono::seconds(10));
+    } else {
+        EXPECT_EQ(recorder.interrupt(), 0);
+    }
+    return "'" + recorder.moviePath() + "'";
+}
+
+class RecorderPeers : public testing::TestWithParam<bool> {};
+
+TEST_P(RecorderPeers, FfprobeFfmpegAndMpvReadTheMovieWithoutAComplaint) {
+    RecorderProcess recorder("picture=320x180@30 sound=48000x2");
+    const std::string movie = record(recorder, GetParam());
+    const Outcome streams = shell("ffprobe -v error -show_entries "
+                                  "format=format_name:stream=codec_name,width,height,color_space,sample_rate,channels "
+                                  "-of compact=nk=1 " +
+                                  movie);
+    EXPECT_EQ(streams.output,
+              "stream|h264|320|180|smpte170m\nstream|pcm_s24be|48000|2\nformat|mov,mp4,m4a,3gp,3g2,mj2\n");
+    const Outcome length = shell("ffprobe -v error -show_entries format=duration -of csv=p=0 " + movie);
+    EXPECT_NEAR(std::atof(length.output.c_str()), 1.9, 0.9);
+    EXPECT_EQ(shell("ffmpeg -v error -i " + movie + " -f null -").output, "");
+    const Outcome played =
+        shell("mpv --no-config --vo=null --ao=null --untimed --msg-level=all=warn --term-status-msg= " + movie);
+    EXPECT_EQ(played.code, 0) << played.output;
+    EXPECT_THAT(played.output, testing::Not(HasSubstr("rror")));
+    const Outcome seeked = shell(
+        "ffprobe -v error -read_intervals 1%+0.2 -select_streams v -show_entries packet=pts_time -of csv=p=0 " + movie);
+    EXPECT_NE(seeked.output, "") << "pictures are found from the middle on";
+}
+
+INSTANTIATE_TEST_SUITE_P(FinishedAndKilled, RecorderPeers, testing::Bool());
+
+TEST(RecorderPeersOnTheNetwork, PictureAndSoundOfASourceOnTheNetworkAreTogether) {
+    const TemporaryDirectory folder;
+    const std::string clip = folder.path("clip.mov");
+    // In the first tenth of each second white pictures and a tone.
+    const Outcome made =
+        shell("ffmpeg -v error -f lavfi -i \"color=c=0x303030:s=320x180:r=30:d=4,drawbox=c=white:t=fill:"
+              "enable='lt(mod(t,1),0.0999)'\" -f lavfi -i \"aevalsrc='if(lt(mod(t,1),0.1),"
+              "0.5*sin(2*PI*1000*t),0)':s=48000:d=4\" -c:v libx264 -preset ultrafast -bf 0 -g 30 -pix_fmt "
+              "yuv420p -c:a pcm_s16le " +
+              clip);
+    ASSERT_EQ(made.code, 0) << made.output;
+    const auto publisher = Process::start({PUBLISH, "--loopback-only", "--port", "0", "--machine", "STUDIO", "--source",
+                                           "Cam 1", "--size", "320x180", "--input", clip});
+    ASSERT_TRUE(publisher && publisher->waitForOutput("(Cam 1)"));
+    RecorderProcess recorder("", "STUDIO (Cam 1)", "exec \"$@\"", "");
+    ASSERT_TRUE(recorder.waitForLength(milliseconds(3500))) << recorder.process().errors();
+    EXPECT_EQ(recorder.interrupt(), 0);
+    const DecodedMovie movie = recorder.movie();
+    ASSERT_TRUE(movie.readable) << movie.error;
+    const auto seen = flashes(movie);
+    const auto heard = tones(movie);
+    ASSERT_GE(seen.size(), 2U);
+    for (const double flash : seen) {
+        double nearest = 1e9;
+        for (const double tone : heard) {
+            nearest = std::abs(tone - flash) < std::abs(nearest) ? tone - flash : nearest;
+        }
+        // The recorder's own share is tested with a scripted source; publisher and network add theirs.
+        EXPECT_NEAR(nearest, 0, 0.080) << "the tone after the flash at " << flash << " s";
+        RecordProperty("offset_us", static_cast<int>(nearest * 1e6));
+    }
+}
+
+} // namespace
+} // namespace qivo::test
