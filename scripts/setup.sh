@@ -16,8 +16,8 @@ packages_to_run=(
     gstreamer1.0-libav
     qt6-image-formats-plugins
 )
-# A virtual screen with a window manager, for machines without a display and for tests.
-packages_for_screen=(xvfb openbox x11-utils util-linux iproute2)
+# A virtual screen with a window manager, and namespaces, for machines without a display and for tests.
+packages_for_screen=(xvfb openbox x11-utils util-linux mount iproute2)
 # The suppressions of leaks name functions, which only llvm's symbolizer can tell.
 packages_to_test=(clang libclang-rt-14-dev llvm libegl1 libgl1 x11-xserver-utils dbus-daemon binutils pulseaudio
     pulseaudio-utils)

@@ -92,6 +92,31 @@ TEST_F(ProgramTest, SignalEndsItInItsUsualOrder) {
     }
 }
 
+TEST_F(ProgramTest, FolderForRecordingsIsChosenInASheetThatDoesNotKeepASignalFromEndingIt) {
+    std::filesystem::create_directory(folder.path("takes"));
+    const auto program = startWithLibrary();
+    ASSERT_TRUE(waitForWindow());
+    screen->activate(*screen->findWindow("QIVO Viewer"));
+    const auto sheet = [&] { return screen->findWindow("Choose the directory for recordings."); };
+    const auto openSheet = [&] {
+        return eventually([&] {
+            screen->key("Alt+r");
+            screen->key("Return");
+            return eventually([&] { return sheet().has_value(); }, std::chrono::seconds(1));
+        });
+    };
+    ASSERT_TRUE(openSheet());
+    EXPECT_TRUE(eventually([&] { return screen->isActive(*sheet()); }));
+    for (const char* key : {"t", "a", "k", "e", "s", "Return"}) {
+        screen->key(key);
+    }
+    EXPECT_TRUE(eventually([&] { return !sheet(); }));
+    ASSERT_TRUE(openSheet());
+    program->signal(SIGTERM);
+    EXPECT_EQ(program->wait(kSoon), 0);
+    EXPECT_THAT(saved(), HasSubstr("ORVQIVOViewer_recordFolder=" + folder.path("takes") + "\n"));
+}
+
 TEST_F(ProgramTest, WithoutLibqivoItSaysSoAndShowsItsWindow) {
     const auto program = start();
     ASSERT_TRUE(waitForWindow());

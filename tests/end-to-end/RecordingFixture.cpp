@@ -19,9 +19,9 @@ namespace {
 constexpr const char* kPlace = "/usr/local/bin/Application.Mac.QIVO.Recording";
 constexpr int kIntervalMs = 33;          // between two pictures
 constexpr int kGapMs = 4 * kIntervalMs;  // which a busy machine may leave out one by one, unlike a piece of the movie
-constexpr double kTimeTolerance = 0.04;  // s between a picture's time in the movie and the clock in the picture
-constexpr double kSettling = 0.3;        // s at the beginning of a movie in which
-constexpr double kUnsettled = 0.1;       // s are tolerated
+constexpr double kTimeTolerance = 0.06;  // s between a picture's time in the movie and the clock in the picture
+constexpr double kSettling = 0.5;        // s at a movie's beginning, for which
+constexpr double kUnsettled = 0.25;      // s are allowed instead
 constexpr double kTracksTolerance = 0.2; // s between the ends of picture and sound
 constexpr double kSoundJumpTolerance = 0.04; // s
 constexpr double kTone = 440;                // Hz
