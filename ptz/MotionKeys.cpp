@@ -1,5 +1,7 @@
 #include "ptz/MotionKeys.h"
 
+#include "platform/KeyState.h"
+
 #include <QKeyEvent>
 #include <QWidget>
 #include <QWindow>
@@ -18,13 +20,14 @@ bool isPlain(const QKeyEvent& event) {
 } // namespace
 
 MotionKeys::MotionKeys(QWidget* window) {
-    window->winId(); // makes the window of the window system, which has the keys before any control
-    window->windowHandle()->installEventFilter(this);
     window->installEventFilter(this);
 }
 
 bool MotionKeys::eventFilter(QObject* watched, QEvent* event) {
     const bool isNative = watched->isWindowType();
+    if (!isNative && event->type() == QEvent::WinIdChange) {
+        watchKeys(*static_cast<QWidget*>(watched));
+    }
     if (isNative && event->type() == QEvent::KeyPress) {
         return handlePress(*static_cast<QKeyEvent*>(event));
     }
@@ -35,6 +38,14 @@ bool MotionKeys::eventFilter(QObject* watched, QEvent* event) {
         letAllGo();
     }
     return QObject::eventFilter(watched, event);
+}
+
+/// The window of the window system has the keys before any control. It is not made here for that: asked for it, the
+/// toolkit would make one of each control of the parent's window too, and cover the picture with them.
+void MotionKeys::watchKeys(const QWidget& window) {
+    if (QWindow* native = window.windowHandle()) {
+        native->installEventFilter(this);
+    }
 }
 
 MotionKeys::Motion MotionKeys::motionOf(const QKeyEvent& event) {
@@ -82,7 +93,7 @@ bool MotionKeys::handleRelease(const QKeyEvent& event) {
     if (held == m_held.end()) {
         return false;
     }
-    if (!event.isAutoRepeat()) {
+    if (!event.isAutoRepeat() && !keyIsDown(event.nativeScanCode())) {
         const Motion motion = held->motion;
         m_held.erase(held);
         announce(motion);

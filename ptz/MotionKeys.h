@@ -45,6 +45,7 @@ class MotionKeys : public QObject {
         Motion motion;
     };
 
+    void watchKeys(const QWidget& window);
     static Motion motionOf(const QKeyEvent& event);
     bool handlePress(const QKeyEvent& event);
     bool handleRelease(const QKeyEvent& event);

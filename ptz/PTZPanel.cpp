@@ -107,12 +107,13 @@ QPoint PTZPanel::placeBesideParent() const {
     constexpr int kGap = 12; // pixels of the toolkit
     const QRect window = parentWidget()->frameGeometry();
     const QRect screen = parentWidget()->screen()->availableGeometry();
+    const int titleBar = parentWidget()->geometry().top() - window.top(); // the panel's will be no higher
     const int beside = window.right() + kGap;
     if (beside + width() <= screen.right()) {
-        return {beside, parentWidget()->geometry().top()};
+        return {beside, window.top()};
     }
     return {std::min(window.right(), screen.right()) - width() - kGap,
-            std::max(screen.top(), std::min(window.bottom(), screen.bottom()) - height() - kGap)};
+            std::max(screen.top(), std::min(window.bottom(), screen.bottom()) - titleBar - height() - kGap)};
 }
 
 void PTZPanel::keyPressEvent(QKeyEvent* event) {

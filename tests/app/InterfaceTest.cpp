@@ -420,6 +420,20 @@ TEST_F(PanelTest, PanelThatWasClosedOpensAnew) {
     EXPECT_NE(interface->ptzPanel(), nullptr);
 }
 
+TEST_F(PanelTest, PictureStaysVisibleBesideThePanel) {
+    fake.addVideo(64, 36, 0xff0000ff, 16.0F / 9.0F);
+    ASSERT_NO_FATAL_FAILURE(connectToCamera());
+    const auto isRed = [&] {
+        const auto picture = screen->largestChild(onScreen);
+        const auto shot = picture ? screen->grab(*picture) : test::Picture();
+        return !shot.empty() && shot.at(shot.width / 2, shot.height / 2).red == 255;
+    };
+    ASSERT_TRUE(runUntil(isRed));
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    runUntil([] { return false; }, std::chrono::milliseconds(200));
+    EXPECT_TRUE(runUntil(isRed, std::chrono::seconds(5)));
+}
+
 TEST_F(PanelTest, OtherSeguesOpenNothing) {
     interface->viewController().performSegue("OtherSegue", nullptr);
     EXPECT_EQ(interface->ptzPanel(), nullptr);

@@ -16,6 +16,7 @@ class MotionKeysTest : public test::ShellFixture {
   protected:
     void SetUp() override {
         ShellFixture::SetUp();
+        window.show();
         QObject::connect(&keys, &MotionKeys::panTilt, &window, [this](int pan, int tilt) {
             told.push_back(std::to_string(pan) + "," + std::to_string(tilt));
         });
