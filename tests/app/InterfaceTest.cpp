@@ -246,6 +246,11 @@ class UserTest : public InterfaceTest {
         runUntil([] { return false; }, std::chrono::milliseconds(200));
     }
 
+    /// Until the window manager has done its part, keys may go nowhere.
+    bool fillsScreen() {
+        return runUntil([&] { return window().isActiveWindow() && window().size() == window().screen()->size(); });
+    }
+
     /// Opens the sources by key, and chooses the second one of the second machine with the arrows.
     void chooseSecondCameraByKeyboard() {
         QIVOFileMenu* menu = interface->delegate().qivoSourcesMenu();
@@ -305,10 +310,13 @@ TEST_F(UserTest, FullScreenIsEnteredAndLeftByKey) {
     EXPECT_TRUE(key("F11", [&] { return window().isFullScreen(); }));
     EXPECT_TRUE(action("actionFullScreen")->isChecked());
     EXPECT_TRUE(runUntil([&] { return window().menuBar()->height() == 0; }));
+    EXPECT_TRUE(fillsScreen());
     EXPECT_TRUE(key("Escape", [&] { return !window().isFullScreen(); }));
     EXPECT_TRUE(runUntil([&] { return window().menuBar()->height() > 0; }));
     EXPECT_FALSE(action("actionFullScreen")->isChecked());
+    EXPECT_TRUE(runUntil([&] { return window().isActiveWindow() && window().size() != window().screen()->size(); }));
     EXPECT_TRUE(key("F11", [&] { return window().isFullScreen(); }));
+    EXPECT_TRUE(fillsScreen());
     EXPECT_TRUE(key("F11", [&] { return !window().isFullScreen(); }));
 }
 
@@ -321,6 +329,7 @@ TEST_F(UserTest, EscapeOutsideFullScreenDoesNothing) {
 
 TEST_F(UserTest, MenusAndShortcutsWorkInFullScreenAlsoAfterAClickOnThePicture) {
     ASSERT_TRUE(key("F11", [&] { return window().isFullScreen(); }));
+    ASSERT_TRUE(fillsScreen());
     expectKeysToWork();
     clickPicture();
     expectKeysToWork();

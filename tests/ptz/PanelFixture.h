@@ -31,7 +31,7 @@ class PanelFixture : public ShellFixture {
         window->setWindowTitle("Main");
         window->setGeometry(60, 60, 480, 270);
         window->show();
-        ASSERT_TRUE(runUntil([&] { return window->isActiveWindow(); }));
+        ASSERT_TRUE(activate(*window));
         open();
         fake.takeCalls();
         log.take();
@@ -49,6 +49,16 @@ class PanelFixture : public ShellFixture {
         panel = std::make_unique<PTZPanel>(window.get()).release(); // the window owns it
         panel->present();
         ASSERT_TRUE(runUntil([&] { return panel->isActiveWindow() && screen->findWindow(kTitle); }));
+    }
+
+    /// The window manager may have other ideas while a window is new.
+    static bool activate(QWidget& widget) {
+        return runUntil([&] {
+            if (!widget.isActiveWindow()) {
+                widget.activateWindow();
+            }
+            return widget.isActiveWindow();
+        });
     }
 
     /// As the video view does when it ends a connection.

@@ -22,7 +22,7 @@ Outcome play(const std::string& command) {
 TEST(Peers, ffprobeReadsTheStreamsSizeRateAndColours) {
     const PublishProcess publisher({});
     const Outcome result =
-        play("ffprobe -v error -show_entries stream=codec_name,width,height,color_space,has_b_frames "
+        play("ffprobe -v error -select_streams v -show_entries stream=codec_name,width,height,color_space,has_b_frames "
              "-of csv=p=0 " +
              publisher.address(0));
     EXPECT_EQ(result.code, 0) << result.output;
