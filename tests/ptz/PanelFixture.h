@@ -30,7 +30,6 @@ class PanelFixture : public ShellFixture {
         window = std::make_unique<QWidget>();
         window->setWindowTitle("Main");
         window->setGeometry(60, 60, 480, 270);
-        window->show();
         ASSERT_TRUE(activate(*window));
         open();
         fake.takeCalls();
@@ -51,14 +50,16 @@ class PanelFixture : public ShellFixture {
         ASSERT_TRUE(runUntil([&] { return panel->isActiveWindow() && screen->findWindow(kTitle); }));
     }
 
-    /// The window manager may have other ideas while a window is new.
+    /// Now and then a window that is new does not learn that it has the keyboard; shown again, it does.
     static bool activate(QWidget& widget) {
-        return runUntil([&] {
-            if (!widget.isActiveWindow()) {
-                widget.activateWindow();
+        for (int attempt = 0; attempt < 5; ++attempt) {
+            widget.show();
+            if (runUntil([&] { return widget.isActiveWindow(); }, std::chrono::seconds(4))) {
+                return true;
             }
-            return widget.isActiveWindow();
-        });
+            widget.hide();
+        }
+        return false;
     }
 
     /// As the video view does when it ends a connection.
