@@ -302,8 +302,8 @@ int main(int argc, char** argv) {
     const std::string url = output.substr(0, output.find_first_of(" \t\n"));
     std::printf("%d x %d, %d pictures a second, %lld s each, from %s\n", kWidth, kHeight, kRate,
                 static_cast<long long>(duration.count()), url.c_str());
-    // Nobody is to pay for what happens once on a machine: programs read from the disk, shaders compiled into the user's
-    // cache, the publisher's encoder loaded.
+    // Nobody is to pay for what happens once on a machine: programs read from the disk, shaders compiled into the
+    // user's cache, the publisher's encoder loaded.
     for (const auto& player : players(url)) {
         measure(*screen, player, seconds(0));
     }
