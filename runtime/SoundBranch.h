@@ -1,6 +1,7 @@
 #pragma once
 
 #include "runtime/GstHandles.h"
+#include "runtime/SenderClock.h"
 #include "runtime/SoundCutter.h"
 
 #include <atomic>
@@ -22,7 +23,8 @@ class SoundBranch {
         std::function<void(std::string)> refused; ///< the sound turned out to be none that is received, and why
     };
 
-    explicit SoundBranch(Calls calls);
+    /// The clock, which somebody else keeps right, must live as long.
+    SoundBranch(Calls calls, const SenderClock& clock);
 
     /// Builds everything behind the pad. False if an element is missing. The encoding is one that has a codec.
     bool build(GstBin* bin, GstPad* pad, const std::string& encoding);
@@ -33,6 +35,7 @@ class SoundBranch {
     void take(GstPad* pad, GstBuffer* buffer);
 
     const Calls m_calls;
+    const SenderClock& m_clock;
     SoundCutter m_cutter;
 };
 
