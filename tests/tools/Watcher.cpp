@@ -22,9 +22,23 @@ std::optional<std::int64_t> Frame::latency() const {
                 : std::nullopt;
 }
 
+namespace {
+
+std::optional<std::int64_t> reportedTime(GstBuffer* buffer) {
+    constexpr std::int64_t unixInNtp = 2'208'988'800'000;
+    const Caps ntp(gst_caps_new_empty_simple("timestamp/x-ntp"));
+    const auto* meta = gst_buffer_get_reference_timestamp_meta(buffer, ntp.get());
+    return meta != nullptr
+               ? std::optional(duration_cast<milliseconds>(nanoseconds(meta->timestamp)).count() - unixInNtp)
+               : std::nullopt;
+}
+
+} // namespace
+
 Watcher::Watcher(const std::string& address, const std::string& protocol) {
     gst_init(nullptr, nullptr);
-    const std::string text = "rtspsrc latency=0 name=in protocols=" + protocol + " ! application/x-rtp,media=video" +
+    const std::string text = "rtspsrc latency=0 name=in add-reference-timestamp-meta=true protocols=" + protocol +
+                             " ! application/x-rtp,media=video" +
                              " ! decodebin ! videoconvert name=convert ! video/x-raw,format=RGBA ! "
                              "appsink name=out sync=false wait-on-eos=false max-buffers=4 drop=true";
     GstElement* parsed = gst_parse_launch(text.c_str(), nullptr);
@@ -46,6 +60,7 @@ std::optional<Frame> Watcher::next(milliseconds deadline) {
     }
     Frame frame;
     frame.received = system_clock::now();
+    frame.reported = reportedTime(gst_sample_get_buffer(sample.get()));
     GstVideoInfo info;
     gst_video_info_from_caps(&info, gst_sample_get_caps(sample.get()));
     GstVideoFrame mapped;
