@@ -27,7 +27,7 @@ void watchInput(GstElement* element, GstPadProbeType mask, GstPadProbeCallback c
 inline constexpr auto kDataProbe =
     static_cast<GstPadProbeType>(GST_PAD_PROBE_TYPE_BUFFER | GST_PAD_PROBE_TYPE_BUFFER_LIST); // NOLINT
 
-/// The time on the source's time line, in units of 100 ns; 0 if there is none.
+/// The time since the stream's beginning, in units of 100 ns; 0 if there is none.
 std::int64_t timecodeOf(GstBuffer* buffer, const GstSegment* segment);
 
 /// Units of 100 ns since the Unix epoch.

@@ -146,6 +146,15 @@ std::size_t bytesOf(GstPadProbeInfo* info) {
     return gst_buffer_get_size(GST_PAD_PROBE_INFO_BUFFER(info));
 }
 
+/// Null for an empty list.
+GstBuffer* firstOf(GstPadProbeInfo* info) {
+    if ((info->type & GST_PAD_PROBE_TYPE_BUFFER_LIST) == 0) {
+        return GST_PAD_PROBE_INFO_BUFFER(info);
+    }
+    GstBufferList* list = GST_PAD_PROBE_INFO_BUFFER_LIST(info);
+    return gst_buffer_list_length(list) > 0 ? gst_buffer_list_get(list, 0) : nullptr;
+}
+
 } // namespace
 
 /// What GStreamer calls, on threads of its own; none of them runs once the pipeline is in its null state.
@@ -186,6 +195,7 @@ struct RtspSession::Callbacks {
     static GstPadProbeReturn packet(GstPad*, GstPadProbeInfo* info, gpointer data) {
         RtspSession& session = self(data);
         session.packetArrived();
+        session.m_clock.look(firstOf(info));
         session.m_unitBytes += bytesOf(info);
         if (session.m_unitBytes > (session.m_settings.media == Media::video ? kLargestUnit : kLargestSoundUnit)) {
             session.fail(Failure::Kind::broken,
@@ -215,7 +225,9 @@ struct RtspSession::Callbacks {
     /// A picture has been converted.
     static GstPadProbeReturn handOn(GstPad* pad, GstPadProbeInfo* info, gpointer data) {
         RtspSession& session = self(data);
-        auto picture = SamplePicture::map(sampleOf(pad, GST_PAD_PROBE_INFO_BUFFER(info)), wallClock());
+        GstBuffer* buffer = GST_PAD_PROBE_INFO_BUFFER(info);
+        auto picture =
+            SamplePicture::map(sampleOf(pad, buffer), session.m_clock.at(GST_BUFFER_PTS(buffer)), wallClock());
         if (picture && session.m_making.exchange(false)) {
             session.m_mailbox->offer(std::move(picture));
         }
@@ -291,6 +303,7 @@ bool RtspSession::build() {
                  "user-agent", "libqivo", nullptr);
     // With the sender's clock followed by a slope rather than an offset, drift cannot add up.
     gst_util_set_object_arg(G_OBJECT(m_source), "buffer-mode", "slave");
+    setIfPresent(m_source, "add-reference-timestamp-meta", "true");
     g_signal_connect(m_source, "select-stream", G_CALLBACK(Callbacks::selectStream), this);
     g_signal_connect(m_source, "before-send", G_CALLBACK(Callbacks::beforeSend), this);
     g_signal_connect(m_source, "pad-added", G_CALLBACK(Callbacks::padAdded), this);
@@ -364,7 +377,7 @@ bool RtspSession::addAudio(GstPad* pad, const std::string& encoding) {
     };
     calls.unitComplete = [this] { m_unitBytes = 0; };
     calls.refused = [this](std::string problem) { fail(Failure::Kind::noStream, std::move(problem)); };
-    m_sound = std::make_unique<SoundBranch>(std::move(calls));
+    m_sound = std::make_unique<SoundBranch>(std::move(calls), m_clock);
     return m_sound->build(GST_BIN(m_pipeline.get()), pad, encoding);
 }
 

@@ -2,6 +2,7 @@
 
 #include "runtime/GstHandles.h"
 #include "runtime/Mailbox.h"
+#include "runtime/SenderClock.h"
 #include "runtime/SoundBranch.h"
 #include "runtime/Wakeup.h"
 
@@ -83,6 +84,7 @@ class RtspSession {
     const Settings m_settings;
     const std::shared_ptr<Mailbox> m_mailbox;
     const std::shared_ptr<Wakeup> m_wakeup;
+    SenderClock m_clock;                  // outlives the pipeline and the sound
     std::unique_ptr<SoundBranch> m_sound; // built by the source's thread; outlives the pipeline that calls it
     GstOwned<GstElement> m_pipeline;
     GstElement* m_source = nullptr; // the pipeline's

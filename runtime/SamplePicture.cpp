@@ -18,7 +18,8 @@ float aspectOf(const GstVideoInfo& info) {
 
 } // namespace
 
-std::unique_ptr<Picture> SamplePicture::map(GstOwned<GstSample> sample, std::int64_t arrived) {
+std::unique_ptr<Picture> SamplePicture::map(GstOwned<GstSample> sample, std::optional<std::int64_t> taken,
+                                            std::int64_t arrived) {
     GstVideoInfo info;
     GstCaps* caps = sample ? gst_sample_get_caps(sample.get()) : nullptr;
     GstBuffer* buffer = sample ? gst_sample_get_buffer(sample.get()) : nullptr;
@@ -38,7 +39,7 @@ std::unique_ptr<Picture> SamplePicture::map(GstOwned<GstSample> sample, std::int
     record.frame_rate_D = GST_VIDEO_INFO_FPS_D(&info) > 0 ? GST_VIDEO_INFO_FPS_D(&info) : 1;
     record.picture_aspect_ratio = aspectOf(info);
     record.frame_format_type = kProgressive;
-    record.timecode = timecodeOf(buffer, gst_sample_get_segment(sample.get()));
+    record.timecode = taken.value_or(timecodeOf(buffer, gst_sample_get_segment(sample.get())));
     record.p_data = static_cast<std::uint8_t*>(GST_VIDEO_FRAME_PLANE_DATA(&picture->m_frame, 0));
     record.line_stride_in_bytes = GST_VIDEO_FRAME_PLANE_STRIDE(&picture->m_frame, 0);
     record.timestamp = arrived;

@@ -64,7 +64,8 @@ struct SoundBranch::Callbacks {
     }
 };
 
-SoundBranch::SoundBranch(Calls calls) : m_calls(std::move(calls)), m_cutter(m_calls.emit) {}
+SoundBranch::SoundBranch(Calls calls, const SenderClock& clock)
+    : m_calls(std::move(calls)), m_clock(clock), m_cutter(m_calls.emit) {}
 
 bool SoundBranch::build(GstBin* bin, GstPad* pad, const std::string& encoding) {
     const SoundCodec& codec = *soundCodecFor(encoding);
@@ -116,6 +117,7 @@ void SoundBranch::take(GstPad* pad, GstBuffer* buffer) {
     }
     piece.count = map.size / static_cast<std::size_t>(GST_AUDIO_INFO_BPF(&info));
     piece.timecode = timecodeOf(buffer, segment);
+    piece.taken = m_clock.at(GST_BUFFER_PTS(buffer));
     piece.arrived = wallClock();
     piece.afterGap = GST_BUFFER_FLAG_IS_SET(buffer, GST_BUFFER_FLAG_DISCONT);
     m_cutter.add(piece);

@@ -2,6 +2,7 @@
 
 #include "runtime/ChannelOrder.h"
 #include "runtime/GstHandles.h"
+#include "runtime/SenderClock.h"
 #include "runtime/SoundCutter.h"
 
 #include <atomic>
@@ -23,7 +24,8 @@ class SoundBranch {
         std::function<void(std::string)> refused; ///< the sound turned out to be none that is received, and why
     };
 
-    explicit SoundBranch(Calls calls);
+    /// The clock, which somebody else keeps right, must live as long.
+    SoundBranch(Calls calls, const SenderClock& clock);
 
     /// Builds everything behind the pad. False if an element is missing. The encoding is one that has a codec.
     bool build(GstBin* bin, GstPad* pad, const std::string& encoding);
@@ -34,6 +36,7 @@ class SoundBranch {
     void take(GstPad* pad, GstBuffer* buffer);
 
     const Calls m_calls;
+    const SenderClock& m_clock;
     SoundCutter m_cutter;
     ChannelOrder m_order = ChannelOrder::decoder; // set before anything flows
 };

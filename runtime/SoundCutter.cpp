@@ -47,6 +47,7 @@ void SoundCutter::add(const Piece& piece) {
     if (m_pending.empty()) {
         m_format = piece.format;
         m_timecode = piece.timecode;
+        m_taken = piece.taken;
         m_arrived = piece.arrived;
     }
     m_pending.insert(m_pending.end(), piece.samples,
@@ -85,7 +86,8 @@ void SoundCutter::emit(std::size_t first, std::size_t count) {
             out[i] = sane(in[i * channels]);
         }
     }
-    m_emit(std::make_unique<Sound>(m_format, std::move(planes), m_timecode + unitsOf(first), m_arrived));
+    const std::int64_t timecode = m_taken.value_or(m_timecode) + unitsOf(first);
+    m_emit(std::make_unique<Sound>(m_format, std::move(planes), timecode, m_arrived));
 }
 
 } // namespace qivo::runtime

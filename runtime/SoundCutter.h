@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <optional>
 #include <vector>
 
 namespace qivo::runtime {
@@ -30,12 +31,13 @@ class SoundCutter {
     using Emit = std::function<void(std::unique_ptr<Sound>)>;
 
     struct Piece {
-        SoundFormat format;             ///< one that is received
-        const float* samples = nullptr; ///< interleaved
-        std::size_t count = 0;          ///< in each channel
-        std::int64_t timecode = 0;      ///< of the first sample, in units of 100 ns
-        std::int64_t arrived = 0;       ///< in units of 100 ns since the Unix epoch
-        bool afterGap = false;          ///< something is missing before it
+        SoundFormat format;                  ///< one that is received
+        const float* samples = nullptr;      ///< interleaved
+        std::size_t count = 0;               ///< in each channel
+        std::int64_t timecode = 0;           ///< of the first sample in the stream, in units of 100 ns
+        std::int64_t arrived = 0;            ///< in units of 100 ns since the Unix epoch
+        bool afterGap = false;               ///< something is missing before it
+        std::optional<std::int64_t> taken{}; ///< when the first sample was, by the sender's clock; frames show it
     };
 
     explicit SoundCutter(Emit emit) : m_emit(std::move(emit)) {}
@@ -56,6 +58,7 @@ class SoundCutter {
     SoundFormat m_format;
     std::vector<float> m_pending; // interleaved
     std::int64_t m_timecode = 0;  // of the first sample that is pending, here and below
+    std::optional<std::int64_t> m_taken;
     std::int64_t m_arrived = 0;
 };
 

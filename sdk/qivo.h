@@ -25,6 +25,11 @@
  * Text
  *   Every string is UTF-8 and NUL-terminated.
  *
+ * Time
+ *   A frame's timecode is the source's time. Below 9466848000000000 (the year 2000) it counts from a beginning of the
+ *   stream's own; from there on it is the sender's clock when the frame was taken, since the Unix epoch, and the same
+ *   for video and audio of a source. It may pass from one to the other, and back when the connection is made again.
+ *
  * Changes
  *   1  first version: 21 operations.
  */

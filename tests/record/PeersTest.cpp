@@ -88,8 +88,7 @@ TEST(RecorderPeersOnTheNetwork, PictureAndSoundOfASourceOnTheNetworkAreTogether)
         for (const double tone : heard) {
             nearest = std::abs(tone - flash) < std::abs(nearest) ? tone - flash : nearest;
         }
-        // The recorder's own share is tested with a scripted source; publisher and network add theirs.
-        EXPECT_NEAR(nearest, 0, 0.080) << "the tone after the flash at " << flash << " s";
+        EXPECT_NEAR(nearest, 0, 0.040) << "the tone after the flash at " << flash << " s";
         RecordProperty("offset_us", static_cast<int>(nearest * 1e6));
     }
 }

@@ -102,6 +102,17 @@ TEST(Recorder, TheClockRunsThroughTheMovieWithPictureAndSoundTogether) {
     EXPECT_EQ(namesIn(recorder.folder().path("movies")).size(), 1U);
 }
 
+TEST(Recorder, PicturesThatAreSlowToComeAreTogetherWithTheirSoundOnceTheSendersClockIsKnown) {
+    RecorderProcess recorder(std::string(kBoth) + " late=120 clock=500");
+    ASSERT_TRUE(recorder.waitForLength(milliseconds(2300))) << recorder.process().errors();
+    EXPECT_EQ(recorder.interrupt(), 0);
+    const DecodedMovie movie = recorder.movie();
+    ASSERT_TRUE(movie.readable) << movie.error;
+    expectClock(movie);
+    expectTogether(movie, 2);
+    EXPECT_LT(movie.soundJump, 0.001);
+}
+
 TEST(Recorder, ASourceThatComesBackGoesOnInTheSameFile) {
     RecorderProcess recorder(std::string(kBoth) + " gone=700-1600");
     ASSERT_TRUE(recorder.waitForLength(milliseconds(2500))) << recorder.process().errors();

@@ -7,9 +7,12 @@
 //   gone=FROM-TO        nothing comes in that time, and stamps begin anew after it
 //   until=MS            nothing comes any more from then on
 //   jitter=MS           pictures come up to so much late, each by another time
+//   late=MS             pictures come so much late
+//   clock=MS            stamps are the wall clock from then on
 //   noise               pictures that cannot be compressed
 // Pictures carry the time at which they were due, which is read from the movie again. In the first tenth of each second
-// they are white and a tone is heard. Pictures and sound have stamps of different beginnings.
+// they are white and a tone is heard. Pictures and sound have stamps of different beginnings
+// unless these are the wall clock.
 #include "sdk/qivo.h"
 #include "tools/publish/TimeCode.h"
 
@@ -52,6 +55,8 @@ struct Script {
     long goneTo = -1;
     long until = -1;
     int jitter = 0;
+    int late = 0;
+    long clockFrom = -1;
     bool noise = false;
 };
 
@@ -68,6 +73,8 @@ Script readScript() {
         std::sscanf(form, "gone=%ld-%ld", &script.goneFrom, &script.goneTo);
         std::sscanf(form, "until=%ld", &script.until);
         std::sscanf(form, "jitter=%d", &script.jitter);
+        std::sscanf(form, "late=%d", &script.late);
+        std::sscanf(form, "clock=%ld", &script.clockFrom);
         script.noise = script.noise || word == "noise";
     }
     return script;
@@ -85,6 +92,12 @@ std::int64_t wallMs(Clock::time_point time) {
     return std::chrono::duration_cast<milliseconds>(wall.time_since_epoch()).count();
 }
 
+/// That of the beginning, in units of 100 ns.
+std::int64_t wallStamp() {
+    static const std::int64_t instance = wallMs(beginning()) * (kUnitsASecond / 1000);
+    return instance;
+}
+
 struct Receiver {
     Script script = readScript();
     bool sound = false;
@@ -96,13 +109,20 @@ struct Receiver {
     long msOf(std::int64_t frame) const {
         return static_cast<long>(frame * 1000 / (sound ? kBlocksASecond : script.rate));
     }
+    milliseconds lateness() {
+        return milliseconds(
+            script.late + (script.jitter > 0 ? static_cast<int>(random() % static_cast<unsigned>(script.jitter)) : 0));
+    }
     bool comes(long ms) const {
         return (ms < script.goneFrom || ms >= script.goneTo) && (script.until < 0 || ms < script.until);
     }
     /// Counts anew after a break.
     std::int64_t stampOf(std::int64_t frame) const {
-        const std::int64_t begins = sound ? kSoundStamp : kPictureStamp;
         const long ms = msOf(frame);
+        if (script.clockFrom >= 0 && ms >= script.clockFrom) {
+            return wallStamp() + frame * kUnitsASecond / (sound ? kBlocksASecond : script.rate);
+        }
+        const std::int64_t begins = sound ? kSoundStamp : kPictureStamp;
         const long from = script.goneTo >= 0 && ms >= script.goneTo ? script.goneTo : 0;
         return begins + frame * kUnitsASecond / (sound ? kBlocksASecond : script.rate) - from * 10'000;
     }
@@ -212,9 +232,7 @@ int32_t QIVOlib_recv_capture_v2(QIVOlib_recv_instance_t handle, QIVOlib_video_fr
         receiver.sound ? audio != nullptr && receiver.script.soundRate > 0 : video != nullptr && rate > 0;
     while (wanted) {
         const auto due = beginning() + std::chrono::nanoseconds(receiver.number * std::nano::den / rate);
-        const auto late = milliseconds(receiver.script.jitter > 0 && !receiver.sound
-                                           ? receiver.random() % static_cast<unsigned>(receiver.script.jitter)
-                                           : 0);
+        const auto late = receiver.sound ? milliseconds(0) : receiver.lateness();
         if (due + late > limit) {
             break;
         }

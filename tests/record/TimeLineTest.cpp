@@ -1,4 +1,5 @@
 // Where pictures and sound go in time: the source's clock, the sound's place, the fragments.
+#include "tools/record/CommonClock.h"
 #include "tools/record/Fragmenter.h"
 #include "tools/record/Progress.h"
 
@@ -71,6 +72,40 @@ TEST(SourceClock, WithoutStampsArrivalCounts) {
     EXPECT_EQ(clock.place({}, seconds(5) + milliseconds(33)), seconds(5) + milliseconds(33));
     EXPECT_EQ(clock.place({}, seconds(5) + milliseconds(33)), seconds(5) + milliseconds(34))
         << "each later than the one before";
+}
+
+TEST(SourceClock, AStreamOfTheSameClockGoesByTheOthersDistance) {
+    SourceClock pictures;
+    SourceClock sound;
+    for (int i = 0; i < 100; ++i) {
+        const Nanoseconds now = seconds(5) + i * milliseconds(40);
+        const Nanoseconds picture = pictures.place(seconds(777) + i * milliseconds(40), now + milliseconds(90));
+        const Nanoseconds heard =
+            sound.place(seconds(777) + i * milliseconds(40), now + milliseconds(i % 5), pictures.offset());
+        if (i > 0) {
+            EXPECT_EQ(heard, picture) << i;
+        }
+    }
+    // Alone again it goes on from there.
+    const Nanoseconds next = seconds(5) + milliseconds(4000);
+    EXPECT_NEAR(ms(sound.place(seconds(781), next) - next), 90, 0.1);
+}
+
+TEST(SourceClock, ADistanceThatCannotBeRightIsNotGoneBy) {
+    SourceClock clock;
+    static_cast<void>(clock.place(seconds(777), seconds(5)));
+    const Nanoseconds wrong = seconds(5) - seconds(777) + SourceClock::jump + milliseconds(1);
+    EXPECT_EQ(clock.place(seconds(778), seconds(6), wrong), seconds(6));
+    EXPECT_EQ(clock.place(seconds(779), seconds(7), wrong - milliseconds(1)), seconds(7) + SourceClock::jump);
+}
+
+TEST(CommonClock, IsForgottenSomeTimeAfterTheLastPicture) {
+    CommonClock clock;
+    EXPECT_EQ(clock.offset(seconds(5)), std::nullopt);
+    clock.tell(-seconds(3), seconds(5));
+    EXPECT_EQ(clock.offset(seconds(5)), -seconds(3));
+    EXPECT_EQ(clock.offset(seconds(5) + CommonClock::lasting - milliseconds(1)), -seconds(3));
+    EXPECT_EQ(clock.offset(seconds(5) + CommonClock::lasting), std::nullopt);
 }
 
 TEST(SoundPlacer, BeginsWhereTheFirstPieceBelongs) {

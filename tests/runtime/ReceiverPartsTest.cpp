@@ -5,14 +5,17 @@
 #include "runtime/HandleRegistry.h"
 #include "runtime/Log.h"
 #include "runtime/Mailbox.h"
+#include "runtime/SenderClock.h"
 #include "runtime/Target.h"
 #include "runtime/TransportMemory.h"
 #include "runtime/Wakeup.h"
+#include "sdk/Timecode.h"
 
 #include <gtest/gtest.h>
 
 #include <algorithm>
 #include <atomic>
+#include <limits>
 #include <thread>
 #include <vector>
 
@@ -21,6 +24,73 @@ namespace {
 
 using namespace std::chrono_literals;
 using Clock = std::chrono::steady_clock;
+
+// --- SenderClock
+
+constexpr std::int64_t kUnixInNtp = 2'208'988'800;
+
+/// Seconds and milliseconds of NTP, as the jitter buffer tells them.
+GstClockTime ntp(std::int64_t unixSeconds, std::int64_t milliseconds = 0) {
+    return static_cast<GstClockTime>((unixSeconds + kUnixInNtp) * 1000 + milliseconds) * GST_MSECOND;
+}
+
+constexpr std::int64_t kSomeSecond = 1'795'230'000;
+constexpr std::int64_t kUnitsPerMs = 10'000;
+
+/// What the clock says about a moment of the stream, in milliseconds since kSomeSecond.
+double sender(const SenderClock& clock, std::int64_t streamMs) {
+    const auto time = clock.at(static_cast<GstClockTime>(streamMs) * GST_MSECOND);
+    return time ? static_cast<double>(*time - kSomeSecond * 1000 * kUnitsPerMs) / kUnitsPerMs : -1.0;
+}
+
+TEST(SenderClock, KnowsNothingBeforeTheFirstReport) {
+    SenderClock clock;
+    EXPECT_EQ(clock.at(GST_SECOND), std::nullopt);
+    clock.note(GST_CLOCK_TIME_NONE, ntp(kSomeSecond));
+    clock.note(GST_SECOND, GST_CLOCK_TIME_NONE);
+    EXPECT_EQ(clock.at(GST_SECOND), std::nullopt);
+    clock.note(GST_SECOND, ntp(kSomeSecond));
+    EXPECT_EQ(sender(clock, 1000), 0.0);
+    EXPECT_EQ(sender(clock, 1040), 40.0);
+    EXPECT_EQ(sender(clock, 960), -40.0) << "what is still being decoded";
+    EXPECT_EQ(clock.at(GST_CLOCK_TIME_NONE), std::nullopt);
+}
+
+TEST(SenderClock, ASenderWithoutTheDateHasNoClock) {
+    for (const std::int64_t second : {-kUnixInNtp, std::int64_t{0}, std::int64_t{946'684'799}}) {
+        SenderClock clock;
+        clock.note(0, ntp(second));
+        EXPECT_EQ(clock.at(0), std::nullopt) << second;
+        if (second > 0) {
+            EXPECT_EQ(clock.at(GST_SECOND), firstWallTimecode);
+        }
+    }
+}
+
+TEST(SenderClock, ReportsThatDifferALittleAreFollowedSlowlyAndTimeGoesOn) {
+    for (const int difference : {30, -30}) {
+        SenderClock clock;
+        clock.note(0, ntp(kSomeSecond));
+        double last = 0;
+        for (int ms = 10; ms <= 1000; ms += 10) {
+            clock.note(static_cast<GstClockTime>(ms) * GST_MSECOND, ntp(kSomeSecond, ms + difference));
+            EXPECT_NEAR(sender(clock, ms) - last, 10, 10.0 / SenderClock::kSlowness + 0.001);
+            last = sender(clock, ms);
+        }
+        EXPECT_NEAR(last, 1000 + difference, 0.001);
+    }
+}
+
+TEST(SenderClock, AClockThatIsSetIsTakenAtOnce) {
+    SenderClock clock;
+    clock.note(0, ntp(kSomeSecond));
+    clock.note(GST_SECOND, ntp(kSomeSecond + 1, 100));
+    EXPECT_EQ(sender(clock, 1000), 1100.0);
+    clock.note(2 * GST_SECOND, ntp(kSomeSecond - 3600));
+    EXPECT_EQ(sender(clock, 2000), -3'600'000.0);
+    clock.note(GST_SECOND, std::numeric_limits<GstClockTime>::max() - 1);
+    EXPECT_EQ(sender(clock, 2000), -3'600'000.0) << "no NTP time";
+}
 
 // --- Backoff
 

@@ -2,6 +2,7 @@
 
 #include "runtime/SoundCutter.h"
 #include "runtime/SoundQueue.h"
+#include "sdk/Timecode.h"
 #include "tests/runtime/RawServer.h"
 #include "tests/runtime/ReceiverFixture.h"
 #include "tests/runtime/RtpPackets.h"
@@ -399,6 +400,21 @@ TEST_F(ReceiverSound, ReceiversOfPicturesSetUpNoSound) {
         EXPECT_NE(receiver->capture(nullptr, &frame, nullptr, 300ms), QIVOlib_frame_type_audio);
         EXPECT_EQ(server.setups(), before + 1);
     }
+}
+
+TEST_F(ReceiverSound, TimecodeIsTheSendersClockOnceItIsReported) {
+    const RtspServer server({.launch = tone(48000, 2) + payloader("AAC"), .reports = 100ms});
+    const auto receiver = listen(server.url());
+    const auto deadline = Clock::now() + 8s;
+    QIVOlib_audio_frame_v2_t frame{};
+    while (frame.timecode < firstWallTimecode && Clock::now() < deadline) {
+        if (receiver->capture(nullptr, &frame, nullptr, 50ms) == QIVOlib_frame_type_audio) {
+            receiver->freeAudio(&frame);
+        }
+    }
+    ASSERT_GE(frame.timecode, firstWallTimecode);
+    const auto delay = static_cast<double>(frame.timestamp - frame.timecode) * 1e-4;
+    EXPECT_NEAR(delay, 0, 500.0 * kSanitizerPatience) << "both are this machine's clock, in milliseconds";
 }
 
 TEST_F(ReceiverSound, QueueDepthIsTrueAndTheOldestComesFirst) {

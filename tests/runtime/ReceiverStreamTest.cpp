@@ -1,5 +1,6 @@
 // What a receiver makes of a source that conforms.
 
+#include "sdk/Timecode.h"
 #include "tests/runtime/CountingAllocator.h"
 #include "tests/runtime/ReceiverFixture.h"
 
@@ -145,17 +146,34 @@ TEST_F(ReceiverStreams, TimesAndRateAreFilledIn) {
     EXPECT_NEAR(static_cast<double>(second.record.timestamp / 10000), static_cast<double>(now), 1000.0);
 }
 
+TEST_F(ReceiverStreams, TimecodeIsTheSendersClockOnceItIsReported) {
+    const RtspServer server({.launch = h264("width=320,height=240,framerate=25/1"), .reports = 100ms});
+    const auto receiver = receive(server.url());
+    const auto reported = [](const Shot& shot) { return shot.record.timecode >= firstWallTimecode; };
+    Shot shot = pictureThat(*receiver, reported);
+    ASSERT_TRUE(shot);
+    for (int i = 0; i < 10; ++i) {
+        const auto before = shot.record;
+        const auto delay = static_cast<double>(before.timestamp - before.timecode) * 1e-4;
+        EXPECT_NEAR(delay, 0, 500.0 * kSanitizerPatience) << "both are this machine's clock, in milliseconds";
+        shot.release();
+        shot = nextPicture(*receiver);
+        ASSERT_TRUE(shot);
+        EXPECT_GT(shot.record.timecode, before.timecode);
+    }
+}
+
 TEST_F(ReceiverStreams, NewestPictureWins) {
     const RtspServer server({.launch = h264("width=320,height=240,framerate=30/1")});
     const auto receiver = receive(server.url());
     Shot first = nextPicture(*receiver);
     ASSERT_TRUE(first);
-    const auto before = first.record.timecode;
+    const auto before = first.record.timestamp;
     first.release();
     std::this_thread::sleep_for(700ms); // a caller that is slow
     const Shot next = nextPicture(*receiver);
     ASSERT_TRUE(next);
-    EXPECT_GT(next.record.timecode - before, 6'000'000) << "an old picture was kept";
+    EXPECT_GT(next.record.timestamp - before, 6'000'000) << "an old picture was kept";
     EXPECT_LE(receiver->queue().video_frames, 1);
 }
 
@@ -297,11 +315,11 @@ TEST_F(ReceiverStreams, AtMostFourPicturesAreInMemory) {
         ASSERT_TRUE(held.back());
     }
     EXPECT_FALSE(nextPicture(*receiver, 500ms)) << "beyond the bound";
-    const auto oldest = held.front().record.timecode;
+    const auto oldest = held.front().record.timestamp;
     held.erase(held.begin());
     const Shot next = nextPicture(*receiver);
     ASSERT_TRUE(next);
-    EXPECT_GT(next.record.timecode - oldest, 4'000'000) << "not the newest";
+    EXPECT_GT(next.record.timestamp - oldest, 4'000'000) << "not the newest";
     EXPECT_GE(counter.most(), 3) << "the pictures are not counted";
     EXPECT_LE(counter.most(), static_cast<int>(runtime::Mailbox::kPictures));
 }

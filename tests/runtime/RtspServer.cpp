@@ -35,11 +35,21 @@ struct RtspServer::Callbacks {
             gst_object_unref(pad);
             gst_object_unref(payloader);
         }
+        g_signal_connect(media, "prepared", G_CALLBACK(prepared), data);
         const std::lock_guard guard(server.m_mutex);
         if (server.m_pipeline != nullptr) {
             gst_object_unref(server.m_pipeline);
         }
         server.m_pipeline = element;
+    }
+
+    static void prepared(GstRTSPMedia* media, gpointer data) {
+        const guint64 interval = std::chrono::nanoseconds(self(data).m_options.reports).count();
+        for (guint i = 0; interval > 0 && i < gst_rtsp_media_n_streams(media); ++i) {
+            GObject* session = gst_rtsp_stream_get_rtpsession(gst_rtsp_media_get_stream(media, i));
+            g_object_set(session, "rtcp-min-interval", interval, nullptr);
+            g_object_unref(session);
+        }
     }
 
     static GstElement* payloaderOf(GstElement* bin, int number) {

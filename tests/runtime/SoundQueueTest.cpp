@@ -47,7 +47,7 @@ class SoundCutterTest : public testing::Test {
             }
         }
         const auto timecode = static_cast<std::int64_t>(m_sinceFormat) * kUnitsPerSecond / std::max(1, format.rate);
-        m_cutter.add({format, samples.data(), count, timecode, 7, afterGap});
+        m_cutter.add({format, samples.data(), count, timecode, 7, afterGap, m_taken});
         m_fed += count;
         m_sinceFormat += count;
     }
@@ -85,6 +85,7 @@ class SoundCutterTest : public testing::Test {
     }};
     std::size_t m_fed = 0;
     std::size_t m_sinceFormat = 0;
+    std::optional<std::int64_t> m_taken; // by the sender's clock, of the next piece
 };
 
 struct Pieces {
@@ -158,6 +159,18 @@ TEST_F(SoundCutterTest, JumpInTimeIsAGap) {
     m_sinceFormat += 48 * SoundCutter::kGap.count() / 2; // what a jitter buffer corrects
     feed({48000, 1}, 480);
     EXPECT_EQ(m_cuts.size(), 3U);
+}
+
+TEST_F(SoundCutterTest, SendersClockIsShownAndItsReportIsNoGap) {
+    feed({48000, 1}, 239);
+    m_taken = 1000 * kUnitsPerSecond;
+    feed({48000, 1}, 241);
+    ASSERT_EQ(m_cuts.size(), 1U) << "in one frame";
+    EXPECT_EQ(m_cuts[0].record.timecode, 0) << "of its first sample";
+    feed({48000, 1}, 3840);
+    ASSERT_EQ(m_cuts.size(), 3U);
+    EXPECT_EQ(m_cuts[1].record.timecode, 1000 * kUnitsPerSecond);
+    EXPECT_EQ(m_cuts[2].record.timecode, 1000 * kUnitsPerSecond + 400'000);
 }
 
 TEST_F(SoundCutterTest, FrameNeverSpansAChangeOfFormat) {

@@ -1,6 +1,3 @@
-# The libraries underneath keep no frame pointers, and only a complete stack tells their leaks from ours.
-set(unwind "ASAN_OPTIONS=detect_leaks=1:detect_stack_use_after_return=1:strict_string_checks=1:fast_unwind_on_malloc=0:malloc_context_size=10")
-
 add_library(qivo_receiver_fixture STATIC CountingAllocator.cpp CountingAllocator.h
                                          ReceiverFixture.cpp ReceiverFixture.h RtspServer.cpp RtspServer.h
                                          RawServer.cpp RawServer.h RtpPackets.h)

@@ -66,6 +66,22 @@ TEST(Serving, fullStreamHasItsSizeColoursAndACurrentClockOverUdpAndTcp) {
     }
 }
 
+TEST(Serving, lateViewerIsToldSoonWhenEachPictureWasTaken) {
+    const PublishProcess publisher({});
+    Watcher first(publisher.address(0));
+    ASSERT_TRUE(first.next());
+    Watcher watcher(publisher.address(0));
+    std::optional<Frame> frame = watcher.next();
+    for (int i = 0; i < 40 && frame && !frame->reported; ++i) {
+        frame = watcher.next();
+    }
+    for (int i = 0; i < 20; ++i, frame = watcher.next()) {
+        ASSERT_TRUE(frame && frame->reported);
+        ASSERT_TRUE(frame->timeCode());
+        EXPECT_NEAR(static_cast<double>(*frame->reported - *frame->timeCode()), 0, 20) << "milliseconds";
+    }
+}
+
 TEST(Serving, lowStreamIsAQuarterOfTheSizeAtHalfTheRateWithTheSameColours) {
     const PublishProcess publisher({});
     Watcher watcher(publisher.address(1));

@@ -25,7 +25,7 @@ StreamClient::StreamClient(const std::string& address, const std::string& protoc
     m_pipeline.reset(GST_ELEMENT(gst_object_ref_sink(parsed)));
     m_sink = element("out");
     const Object<GstElement> in = element("in");
-    g_object_set(in.get(), "location", address.c_str(), nullptr);
+    g_object_set(in.get(), "location", address.c_str(), "add-reference-timestamp-meta", TRUE, nullptr);
     g_signal_connect_data(
         in.get(), "select-stream", G_CALLBACK(isOfMedium), g_strdup(medium),
         [](gpointer name, GClosure*) { g_free(name); }, static_cast<GConnectFlags>(0));

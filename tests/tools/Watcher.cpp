@@ -21,6 +21,19 @@ std::optional<std::int64_t> Frame::latency() const {
                 : std::nullopt;
 }
 
+namespace {
+
+std::optional<std::int64_t> reportedTime(GstBuffer* buffer) {
+    constexpr std::int64_t unixInNtp = 2'208'988'800'000;
+    const Caps ntp(gst_caps_new_empty_simple("timestamp/x-ntp"));
+    const auto* meta = gst_buffer_get_reference_timestamp_meta(buffer, ntp.get());
+    return meta != nullptr
+               ? std::optional(duration_cast<milliseconds>(nanoseconds(meta->timestamp)).count() - unixInNtp)
+               : std::nullopt;
+}
+
+} // namespace
+
 Watcher::Watcher(const std::string& address, const std::string& protocol)
     : m_stream(address, protocol, "video", 0,
                "decodebin ! videoconvert name=convert ! video/x-raw,format=RGBA ! "
@@ -33,6 +46,7 @@ std::optional<Frame> Watcher::next(milliseconds deadline) {
     }
     Frame frame;
     frame.received = system_clock::now();
+    frame.reported = reportedTime(gst_sample_get_buffer(sample.get()));
     GstVideoInfo info;
     gst_video_info_from_caps(&info, gst_sample_get_caps(sample.get()));
     GstVideoFrame mapped;

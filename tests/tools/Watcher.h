@@ -16,6 +16,8 @@ struct Frame {
     int height = 0;
     std::vector<std::uint8_t> pixels;
     std::chrono::system_clock::time_point received;
+    /// When it was taken by the sender's RTCP reports, in milliseconds since the Unix epoch; empty before the first.
+    std::optional<std::int64_t> reported;
 
     [[nodiscard]] const std::uint8_t* at(int x, int y) const {
         return &pixels[4 * (static_cast<std::size_t>(y) * width + x)];

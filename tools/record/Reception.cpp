@@ -1,5 +1,6 @@
 #include "tools/record/Reception.h"
 
+#include "sdk/Timecode.h"
 #include "tools/record/Arguments.h"
 #include "tools/record/MovieWriter.h"
 
@@ -30,8 +31,8 @@ Nanoseconds wallNow() {
 
 } // namespace
 
-Reception::Reception(Kind kind, const std::string& source, Calls calls)
-    : m_kind(kind), m_calls(std::move(calls)), m_receiver(createReceiver(kind, source)) {
+Reception::Reception(Kind kind, const std::string& source, Calls calls, CommonClock& common)
+    : m_kind(kind), m_calls(std::move(calls)), m_common(common), m_receiver(createReceiver(kind, source)) {
     if (started()) {
         m_thread = std::thread([this] { run(); });
     }
@@ -61,7 +62,23 @@ Nanoseconds Reception::place(std::int64_t timecode, std::int64_t timestamp) {
     const bool told = waited > Nanoseconds(0) && waited < longestWaiting;
     const Nanoseconds now = steadyNow();
     m_lastFrame = now.count();
-    return m_clock.place(Nanoseconds(timecode * nanosecondsPerUnit), told ? now - waited : now);
+    const Nanoseconds arrival = told ? now - waited : now;
+    return m_kind == Kind::picture ? placePicture(timecode, arrival) : placeSound(timecode, arrival);
+}
+
+Nanoseconds Reception::placePicture(std::int64_t timecode, Nanoseconds arrival) {
+    const Nanoseconds place = m_clock.place(Nanoseconds(timecode * nanosecondsPerUnit), arrival);
+    if (timecode >= firstWallTimecode) {
+        m_common.tell(m_clock.offset(), steadyNow());
+    }
+    return place;
+}
+
+/// Pictures are decoded, which takes them longer: by arrival the sound would be ahead of them.
+Nanoseconds Reception::placeSound(std::int64_t timecode, Nanoseconds arrival) {
+    const Nanoseconds stamp(timecode * nanosecondsPerUnit);
+    const auto offset = timecode >= firstWallTimecode ? m_common.offset(steadyNow()) : std::nullopt;
+    return offset ? m_clock.place(stamp, arrival, *offset) : m_clock.place(stamp, arrival);
 }
 
 void Reception::capture() {

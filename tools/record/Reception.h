@@ -1,6 +1,7 @@
 #pragma once
 
 #include "sdk/qivo.h"
+#include "tools/record/CommonClock.h"
 #include "tools/record/SourceClock.h"
 
 #include <atomic>
@@ -21,7 +22,8 @@ class Reception {
         std::function<void(const QIVOlib_audio_frame_v2_t&, Nanoseconds place)> sound;
     };
 
-    Reception(Kind kind, const std::string& source, Calls calls);
+    /** The clock is that of both kinds and outlives them. */
+    Reception(Kind kind, const std::string& source, Calls calls, CommonClock& common);
     ~Reception();
     Reception(const Reception&) = delete;
     Reception& operator=(const Reception&) = delete;
@@ -37,9 +39,12 @@ class Reception {
     void run();
     void capture();
     [[nodiscard]] Nanoseconds place(std::int64_t timecode, std::int64_t timestamp);
+    [[nodiscard]] Nanoseconds placePicture(std::int64_t timecode, Nanoseconds arrival);
+    [[nodiscard]] Nanoseconds placeSound(std::int64_t timecode, Nanoseconds arrival);
 
     const Kind m_kind;
     const Calls m_calls;
+    CommonClock& m_common;
     SourceClock m_clock; // thread only
     QIVOlib_recv_instance_t m_receiver = nullptr;
     std::atomic<bool> m_stopped = false;

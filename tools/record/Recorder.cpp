@@ -15,8 +15,8 @@ Recorder::Recorder(Settings settings, MoviePlace place) : m_settings(std::move(s
     Reception::Calls calls;
     calls.picture = [this](const auto& frame, Nanoseconds at) { takePicture(frame, at); };
     calls.sound = [this](const auto& frame, Nanoseconds at) { takeSound(frame, at); };
-    m_pictures.emplace(Reception::Kind::picture, m_settings.source, calls);
-    m_sounds.emplace(Reception::Kind::sound, m_settings.source, calls);
+    m_pictures.emplace(Reception::Kind::picture, m_settings.source, calls, m_clock);
+    m_sounds.emplace(Reception::Kind::sound, m_settings.source, calls, m_clock);
     if (!m_pictures->started() || !m_sounds->started()) {
         const std::lock_guard guard(m_mutex);
         m_problem = "the source \"" + m_settings.source + "\" is refused";

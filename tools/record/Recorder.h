@@ -60,6 +60,7 @@ class Recorder {
     std::atomic<std::uint64_t> m_dropped = 0;
     std::atomic<std::int64_t> m_lastDrop = 0;
     std::atomic<bool> m_anyPicture = false;
+    CommonClock m_clock; // outlives both
     std::optional<Reception> m_pictures;
     std::optional<Reception> m_sounds;
 };

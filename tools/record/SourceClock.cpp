@@ -22,6 +22,18 @@ Nanoseconds SourceClock::place(Nanoseconds stamp, Nanoseconds arrival) {
             follow(deviation, arrival);
         }
     }
+    return placed(stamp, arrival);
+}
+
+Nanoseconds SourceClock::place(Nanoseconds stamp, Nanoseconds arrival, Nanoseconds offset) {
+    if (!m_begun || std::chrono::abs(arrival - (stamp + offset)) > jump) {
+        return place(stamp, arrival);
+    }
+    m_offset = offset;
+    return placed(stamp, arrival);
+}
+
+Nanoseconds SourceClock::placed(Nanoseconds stamp, Nanoseconds arrival) {
     m_arrival = arrival;
     m_stamp = stamp;
     m_place = std::max(stamp + m_offset, m_place + shortestStep);

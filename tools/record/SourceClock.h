@@ -12,7 +12,10 @@ using Nanoseconds = std::chrono::nanoseconds;
  *  Arrival is when a frame could have been shown, and jitters; the source's stamps do not, but count from nowhere in
  *  particular, anew with each connection. The distance between the two is followed along its lower edge, the frames
  * that came with the least delay: at once in the first seconds, then so slowly that the source's spacing is kept. A
- * stamp that does not fit its arrival by half a second begins anew, as after a break. */
+ * stamp that does not fit its arrival by half a second begins anew, as after a break.
+ *
+ * A stream whose stamps are of the same clock as another's follows that one's distance instead, so that both are
+ * together as they were taken. */
 class SourceClock {
   public:
     static constexpr Nanoseconds jump = std::chrono::milliseconds(500);
@@ -22,8 +25,13 @@ class SourceClock {
 
     /** The place of a frame with this stamp that arrived then; later than that of the frame before. */
     [[nodiscard]] Nanoseconds place(Nanoseconds stamp, Nanoseconds arrival);
+    /** The same by the distance of another stream; by its own as above where the two do not fit by half a second. */
+    [[nodiscard]] Nanoseconds place(Nanoseconds stamp, Nanoseconds arrival, Nanoseconds offset);
+    /** From stamps to places, as the last frame was placed. */
+    [[nodiscard]] Nanoseconds offset() const { return m_offset; }
 
   private:
+    [[nodiscard]] Nanoseconds placed(Nanoseconds stamp, Nanoseconds arrival);
     void follow(Nanoseconds deviation, Nanoseconds arrival);
     void begin(Nanoseconds stamp, Nanoseconds arrival);
 
