@@ -80,9 +80,8 @@ Scene::Level halved(const Scene::Level& from) {
         const std::uint8_t* upper = &from.samples[static_cast<std::size_t>(2 * y) * from.width];
         const std::uint8_t* lower = upper + from.width;
         std::uint8_t* row = &to.samples[static_cast<std::size_t>(y) * to.width];
-        for (int x = 0; x < to.width; ++x) {
-            row[x] =
-                static_cast<std::uint8_t>((upper[2 * x] + upper[2 * x + 1] + lower[2 * x] + lower[2 * x + 1] + 2) / 4);
+        for (int x = 0; x < to.width; ++x, upper += 2, lower += 2) {
+            row[x] = static_cast<std::uint8_t>((upper[0] + upper[1] + lower[0] + lower[1] + 2) / 4);
         }
     }
     return to;
