@@ -1,5 +1,6 @@
 #include "tests/end-to-end/ViewerFixture.h"
 
+#include "tests/runtime/Patience.h"
 #include "tools/publish/TimeCode.h"
 
 #include <algorithm>
@@ -171,7 +172,7 @@ std::optional<std::int64_t> ViewerTest::shownTime() const {
 }
 
 bool ViewerTest::picturesArrive(std::int64_t after, std::chrono::milliseconds deadline) const {
-    constexpr std::int64_t kFreshMs = 1000;
+    constexpr std::int64_t kFreshMs = kSanitizerPatience > 1 ? 3000 : 1000;
     return eventually(
         [&] {
             const auto time = shownTime();
