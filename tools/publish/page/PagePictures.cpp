@@ -25,14 +25,13 @@ PagePictures::~PagePictures() {
 
 void PagePictures::next(std::uint64_t last, Taker taker) {
     m_asked = std::chrono::steady_clock::now();
-    if (m_pipeline == nullptr && !begin()) {
-        taker({}, 0);
-    } else if (m_number != 0 && m_number != last) {
+    const bool running = m_pipeline != nullptr || begin();
+    if (running && m_number != 0 && m_number != last) {
         taker(m_newest, m_number);
-    } else if (m_waiting.size() >= maximumWaiting) {
-        taker({}, 0);
-    } else {
+    } else if (running && m_waiting.size() < maximumWaiting) {
         m_waiting.push_back({std::move(taker), m_asked});
+    } else {
+        taker({}, 0);
     }
 }
 
