@@ -4,14 +4,14 @@ add_library(qivo_receiver_fixture STATIC CountingAllocator.cpp CountingAllocator
 target_link_libraries(qivo_receiver_fixture PUBLIC qivo_runtime PkgConfig::GSTRTSPSERVER GTest::gtest)
 
 qivo_test(receiver-streams SOURCES ReceiverStreamTest.cpp LIBRARIES qivo_receiver_fixture NETWORK BUSY
-          ENVIRONMENT ${unwind})
+          SHARES 2 ENVIRONMENT ${unwind})
 qivo_test(receiver-hostile SOURCES ReceiverHostileTest.cpp LIBRARIES qivo_receiver_fixture NETWORK
-          ENVIRONMENT ${unwind})
+          SHARES 4 ENVIRONMENT ${unwind})
 qivo_test(receiver-healing SOURCES ReceiverHealingTest.cpp LIBRARIES qivo_receiver_fixture NETWORK BUSY
-          ENVIRONMENT ${unwind})
+          SHARES 2 ENVIRONMENT ${unwind})
 qivo_test(sound-parts SOURCES ChannelOrderTest.cpp SoundQueueTest.cpp LIBRARIES qivo_runtime TSAN)
 qivo_test(receiver-sound SOURCES ReceiverSoundTest.cpp LIBRARIES qivo_receiver_fixture qivo_test_tone NETWORK BUSY
-          ENVIRONMENT ${unwind} TIMEOUT 120)
+          SHARES 3 ENVIRONMENT ${unwind} TIMEOUT 120)
 qivo_test(receiver-parts SOURCES ReceiverPartsTest.cpp LIBRARIES qivo_runtime TSAN)
 
 # Through the library itself, which brings its own copy of everything that it is made of.

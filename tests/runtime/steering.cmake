@@ -4,7 +4,7 @@ target_link_libraries(qivo_scripted_camera PUBLIC qivo_runtime_steering GTest::g
 
 qivo_test(test-steering-parts SOURCES SteeringPartsTest.cpp SteeringQueueTest.cpp LIBRARIES qivo_runtime_steering TSAN)
 qivo_test(test-steering SOURCES SteeringTest.cpp SteeringQuirksTest.cpp LIBRARIES qivo_scripted_camera
-          PkgConfig::GSTREAMER NETWORK TSAN SERIAL)
+          PkgConfig::GSTREAMER NETWORK TSAN SERIAL SHARES 1)
 
 # Through receivers and, in a process of its own, through the library as it is installed.
 if(NOT QIVO_SANITIZE STREQUAL "thread")
