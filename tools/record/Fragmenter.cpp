@@ -9,6 +9,7 @@ namespace {
 
 constexpr std::int64_t nanosecondsPerSecond = std::nano::den;
 constexpr Nanoseconds lateness = std::chrono::milliseconds(100);
+constexpr std::uint32_t longestUsual = movieTimescale / 5; // a gap is nothing usual
 
 std::int64_t unitsIn(Nanoseconds time) {
     return time.count() / nanosecondsPerSecond * movieTimescale +
@@ -51,9 +52,9 @@ void Fragmenter::addPicture(CodedPicture picture, Nanoseconds now) {
     } else {
         MoviePicture& last = m_pictures.back();
         placed.start = std::max(placed.start, last.start + 1);
-        last.duration = static_cast<std::uint32_t>(placed.start - last.start);
-        m_usualDuration = last.duration;
-        placed.duration = last.duration;
+        last.duration = pictureDuration(placed.start - last.start);
+        m_usualDuration = std::min(last.duration, longestUsual);
+        placed.duration = m_usualDuration;
     }
     reach(time);
     m_pictures.push_back(std::move(placed));
@@ -133,7 +134,8 @@ Fragment Fragmenter::take(Nanoseconds now) {
     // How long the last picture lasts is known when the next one comes, unless that takes too long.
     std::size_t pictures = m_pictures.empty() ? 0 : m_pictures.size() - 1;
     if (!m_pictures.empty() && now - m_lastAdded >= fragmentLength) {
-        m_pictures.back().duration = static_cast<std::uint32_t>(unitsIn(fragmentLength / 2));
+        // Less than usual, so that the next one begins where it belongs also if it is only late in coming here.
+        m_pictures.back().duration = std::max<std::uint32_t>(m_usualDuration / 2, 1);
         pictures = m_pictures.size();
     }
     Fragment fragment = cut(pictures);

@@ -1,6 +1,8 @@
 #pragma once
 
+#include <algorithm>
 #include <cstdint>
+#include <limits>
 #include <vector>
 
 namespace qivo::record {
@@ -38,6 +40,12 @@ struct MoviePicture {
     std::uint32_t duration = 0;      ///< the same
     bool key = false;                ///< can be decoded without others
 };
+
+/** How long a picture stands until the next one, in the number that files have for it; what is longer becomes the
+ *  longest that all readers take. */
+[[nodiscard]] inline std::uint32_t pictureDuration(std::int64_t units) {
+    return static_cast<std::uint32_t>(std::min<std::int64_t>(units, std::numeric_limits<std::int32_t>::max()));
+}
 
 /** What is written at once: from then on it can be played, whatever happens. */
 struct Fragment {

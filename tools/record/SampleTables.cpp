@@ -1,5 +1,8 @@
 #include "tools/record/SampleTables.h"
 
+#include <algorithm>
+#include <limits>
+
 namespace qivo::record {
 
 void SampleTables::add(const Fragment& fragment, std::uint64_t offset, std::size_t soundFrameBytes) {
@@ -8,7 +11,7 @@ void SampleTables::add(const Fragment& fragment, std::uint64_t offset, std::size
     }
     for (const MoviePicture& picture : fragment.pictures) {
         if (!pictures.empty()) {
-            pictures.back().duration = static_cast<std::uint32_t>(picture.start - pictures.back().start);
+            pictures.back().duration = pictureDuration(picture.start - pictures.back().start);
         }
         const auto size = static_cast<std::uint32_t>(picture.bytes.size());
         pictures.push_back({picture.start, picture.duration, size, picture.key});
@@ -26,6 +29,14 @@ void SampleTables::add(const Fragment& fragment, std::uint64_t offset, std::size
 
 std::int64_t SampleTables::pictureEnd() const {
     return pictures.empty() ? 0 : pictures.back().start + pictures.back().duration;
+}
+
+bool SampleTables::fitsIndex() const {
+    // Readers take the number for a signed one.
+    const auto last = std::numeric_limits<std::int32_t>::max();
+    return soundFrames <= std::numeric_limits<std::uint32_t>::max() &&
+           std::all_of(pictures.begin(), pictures.end(),
+                       [last](const Picture& picture) { return picture.duration < last; });
 }
 
 } // namespace qivo::record

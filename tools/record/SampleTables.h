@@ -12,7 +12,7 @@ namespace qivo::record {
 struct SampleTables {
     struct Picture {
         std::int64_t start = 0;
-        std::uint32_t duration = 0; ///< until the next one where there is one
+        std::uint32_t duration = 0; ///< until the next one where there is one, as far as the number goes
         std::uint32_t size = 0;
         bool key = false;
     };
@@ -32,6 +32,9 @@ struct SampleTables {
 
     [[nodiscard]] std::int64_t pictureStart() const { return pictures.empty() ? 0 : pictures.front().start; }
     [[nodiscard]] std::int64_t pictureEnd() const;
+    /** False if a plain movie's index has no numbers large enough: more than 2^32 frames of sound (24 hours at 48000
+     * Hz), or a picture that stands for more than 2^31 units of movieTimescale (6 hours). */
+    [[nodiscard]] bool fitsIndex() const;
 };
 
 } // namespace qivo::record

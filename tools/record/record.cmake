@@ -1,26 +1,30 @@
-# The recorder. Everything but its main function, so that tests reach the classes; whoever links it brings a libqivo.
-add_library(qivo_record STATIC
-    record/Arguments.cpp
-    record/EncoderChoice.cpp
+# What becomes of coded pictures and sound: the time line and the file. It needs no GStreamer.
+add_library(qivo_movie STATIC
     record/Fragmenter.cpp
     record/MovieAtoms.cpp
     record/MovieFile.cpp
     record/MoviePlace.cpp
     record/MovieWriter.cpp
+    record/SampleDescription.cpp
+    record/SampleTables.cpp
+    record/SoundPlacer.cpp
+    record/TrackAtoms.cpp)
+target_link_libraries(qivo_movie PUBLIC Threads::Threads PRIVATE qivo_options)
+
+# The recorder. Everything but its main function, so that tests reach the classes; whoever links it brings a libqivo.
+add_library(qivo_record STATIC
+    record/Arguments.cpp
+    record/EncoderChoice.cpp
     record/PictureEncoder.cpp
     record/PictureFitter.cpp
     record/PictureShape.cpp
     record/Progress.cpp
     record/Reception.cpp
     record/Recorder.cpp
-    record/SampleDescription.cpp
-    record/SampleTables.cpp
     record/SoundFitter.cpp
-    record/SoundPlacer.cpp
     record/SourceClock.cpp
-    record/Surroundings.cpp
-    record/TrackAtoms.cpp)
-target_link_libraries(qivo_record PUBLIC qivo_interface PkgConfig::GSTREAMER Threads::Threads PRIVATE qivo_options)
+    record/Surroundings.cpp)
+target_link_libraries(qivo_record PUBLIC qivo_movie qivo_interface PkgConfig::GSTREAMER PRIVATE qivo_options)
 
 add_executable(qivo-record record/main.cpp)
 set_target_properties(qivo-record PROPERTIES OUTPUT_NAME Application.Mac.QIVO.Recording)
