@@ -120,7 +120,7 @@ TEST_F(MovieFileTest, WhatDoesNotFitIsTakenBackAndTheRestStaysPlayable) {
     ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &limit), 0);
     const std::uint64_t size = movie.size();
     EXPECT_FALSE(movie.append(soundFragment(2)));
-    EXPECT_EQ(movie.error(), EFBIG);
+    EXPECT_EQ(movie.error(), "File too large");
     EXPECT_EQ(std::filesystem::file_size(m_path), size);
     ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &before), 0);
     expectSound(test::decodeMovie(m_path), 2);
@@ -158,6 +158,45 @@ TEST(SampleTables, APictureLastsUntilTheNextOverFragmentsAndGaps) {
     EXPECT_EQ(tables.pictures[1].duration, 310000U) << "over a gap as well";
     EXPECT_EQ(tables.pictureEnd(), 403000);
     EXPECT_EQ(tables.pictureChunks[1].offset, 200U);
+}
+
+TEST(SampleTables, WhatAnIndexHasNoNumbersForDoesNotFit) {
+    SampleTables tables;
+    Fragment fragment;
+    fragment.pictures = {{{1}, 0, 3000, true}};
+    tables.add(fragment, 100, 6);
+    tables.soundFrames = 0xFFFFFFFF; // 24 h 51 min at 48000 Hz
+    EXPECT_TRUE(tables.fitsIndex());
+    ++tables.soundFrames;
+    EXPECT_FALSE(tables.fitsIndex());
+    tables.soundFrames = 0;
+    fragment.pictures = {{{1}, 0x7FFFFFFE, 3000, true}};
+    tables.add(fragment, 200, 6);
+    EXPECT_TRUE(tables.fitsIndex());
+    EXPECT_EQ(tables.pictures[0].duration, 0x7FFFFFFEU);
+    fragment.pictures = {{{1}, 0x7FFFFFFELL + 0x1'0000'0010, 3000, true}};
+    tables.add(fragment, 300, 6);
+    EXPECT_FALSE(tables.fitsIndex()) << "and not the 16 units that 32 bits would leave of it";
+    EXPECT_EQ(tables.pictureEnd(), 0x7FFFFFFELL + 0x1'0000'0010 + 3000);
+}
+
+/// What the index of a day costs: it is written when the recording ends, which is to take less than a second.
+TEST(MovieAtoms, TheIndexOfADayIsAsLongAsItsPicturesNeed) {
+    constexpr std::uint32_t pictures = 24 * 60 * 60 * 30;
+    MovieInfo info;
+    info.picture.emplace();
+    info.picture->width = 16;
+    info.picture->height = 16;
+    SampleTables tables;
+    for (std::uint32_t i = 0; i < pictures; ++i) {
+        tables.pictures.push_back({i * 3000LL, 3000, 1000, i % 60 == 0});
+        if (i % 12 == 0) {
+            tables.pictureChunks.push_back({i * 1000ULL, 12});
+        }
+    }
+    const std::size_t size = indexOf(info, tables).size();
+    EXPECT_GE(size, 4ULL * pictures) << "the size of each";
+    EXPECT_LE(size, 5ULL * pictures);
 }
 
 } // namespace

@@ -37,7 +37,7 @@ class MoviePlaceTest : public testing::Test {
         return MoviePlace(source, m_folder.path() + "/" + source + ".mov");
     }
     /// Makes the movie's file with that content.
-    static void record(const MoviePlace& place, const std::string& content) {
+    static void record(MoviePlace place, const std::string& content) {
         ASSERT_EQ(place.problem(), "");
         std::string problem;
         const FileHandle file = place.create(problem);

@@ -1,7 +1,9 @@
 #include "tools/record/MovieFile.h"
 
 #include <cerrno>
+#include <cstring>
 #include <ctime>
+#include <sys/stat.h>
 #include <unistd.h>
 #include <utility>
 
@@ -57,6 +59,17 @@ bool MovieFile::toDisk() {
     return false;
 }
 
+/// What nobody can find any more would be written until the disk is full.
+bool MovieFile::stillThere() {
+    struct stat about {};
+    m_deleted = fstat(m_file.get(), &about) == 0 && about.st_nlink == 0;
+    return !m_deleted;
+}
+
+std::string MovieFile::error() const {
+    return m_deleted ? "it has been deleted" : m_error != 0 ? std::strerror(m_error) : "";
+}
+
 bool MovieFile::writeHead() {
     return write(headOf(m_info, m_tables), 0);
 }
@@ -93,7 +106,7 @@ bool MovieFile::append(const Fragment& fragment) {
         }
         m_end = headBytes;
     }
-    if (writeFragment(fragment) && writeHead()) {
+    if (writeFragment(fragment) && writeHead() && stillThere()) {
         return true;
     }
     cutToWhole();
@@ -108,7 +121,7 @@ void MovieFile::cutToWhole() {
 }
 
 bool MovieFile::finish() {
-    if (m_end == 0) {
+    if (m_end == 0 || !m_tables.fitsIndex()) {
         return true;
     }
     const std::vector<std::uint8_t> index = indexOf(m_info, m_tables);

@@ -46,20 +46,24 @@ class MovieFile {
 
     /** Writes a fragment and hands it to the disk. Nothing happens with an empty one. */
     [[nodiscard]] bool append(const Fragment& fragment);
-    /** Makes a plain movie of what was written; nothing more can be appended. */
+    /** Makes a plain movie of what was written, or leaves it one of fragments where it is too long for an index;
+     * nothing more can be appended. */
     [[nodiscard]] bool finish();
 
     [[nodiscard]] const SampleTables& tables() const { return m_tables; }
     /** Length of the file in bytes. */
     [[nodiscard]] std::uint64_t size() const { return m_end; }
-    /** The system's number of the last failure. */
-    [[nodiscard]] int error() const { return m_error; }
+    /** Whether anything was written that can be played. */
+    [[nodiscard]] bool isEmpty() const { return m_sequence == 0; }
+    /** What the last failure was; empty if there was none. */
+    [[nodiscard]] std::string error() const;
 
   private:
     [[nodiscard]] bool write(const std::vector<std::uint8_t>& data, std::uint64_t offset);
     [[nodiscard]] bool writeHead();
     [[nodiscard]] bool writeFragment(const Fragment& fragment);
     [[nodiscard]] bool toDisk();
+    [[nodiscard]] bool stillThere();
     void cutToWhole();
 
     FileHandle m_file;
@@ -67,7 +71,8 @@ class MovieFile {
     SampleTables m_tables;
     std::uint64_t m_end = 0; ///< of what is complete
     std::uint32_t m_sequence = 0;
-    int m_error = 0;
+    int m_error = 0; ///< the system's number
+    bool m_deleted = false;
 };
 
 } // namespace qivo::record

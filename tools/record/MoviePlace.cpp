@@ -129,15 +129,43 @@ bool MoviePlace::makeFolders(std::string& problem) const {
     return true;
 }
 
-bool MoviePlace::keepExisting(std::string& problem) const {
+/// The names in the movie's folder, and those of the folders that may have been made.
+void MoviePlace::foldersToDisk() const {
+    std::string folder = folderOf(m_path);
+    while (true) {
+        const FileHandle opened(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+        fsync(opened.get()); // which some file systems cannot
+        if (folder.size() <= m_folder.size()) {
+            return;
+        }
+        folder = folderOf(folder);
+    }
+}
+
+void MoviePlace::takeBack() {
+    struct stat there {};
+    if (lstat(m_path.c_str(), &there) != 0 || there.st_dev != m_made.st_dev || there.st_ino != m_made.st_ino) {
+        return;
+    }
+    unlink(m_path.c_str());
+    if (!m_kept.empty()) {
+        renameWithoutReplacing(m_kept, m_path);
+    }
+    foldersToDisk();
+}
+
+bool MoviePlace::keepExisting(std::string& problem) {
     struct stat existing {};
     if (lstat(m_path.c_str(), &existing) != 0) {
         return true;
     }
     int error = EEXIST;
     for (int attempt = 1; error == EEXIST && attempt <= mostAttempts; ++attempt) {
-        const std::string kept = keptName(fileNameOf(m_path), existing.st_mtime, attempt);
-        error = renameWithoutReplacing(m_path, folderOf(m_path) + "/" + kept);
+        m_kept = folderOf(m_path) + "/" + keptName(fileNameOf(m_path), existing.st_mtime, attempt);
+        error = renameWithoutReplacing(m_path, m_kept);
+    }
+    if (error != 0) {
+        m_kept.clear();
     }
     if (error != 0 && error != ENOENT) {
         problem = reason("keep the movie that is there as \"" + m_path + "\"", error);
@@ -146,7 +174,7 @@ bool MoviePlace::keepExisting(std::string& problem) const {
     return true;
 }
 
-FileHandle MoviePlace::create(std::string& problem) const {
+FileHandle MoviePlace::create(std::string& problem) {
     if (!makeFolders(problem)) {
         return FileHandle();
     }
@@ -157,6 +185,8 @@ FileHandle MoviePlace::create(std::string& problem) const {
         }
         FileHandle file(open(m_path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, fileMode));
         if (file) {
+            fstat(file.get(), &m_made);
+            foldersToDisk();
             return file;
         }
         error = errno;

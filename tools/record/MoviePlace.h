@@ -4,6 +4,7 @@
 
 #include <ctime>
 #include <string>
+#include <sys/stat.h>
 
 namespace qivo::record {
 
@@ -20,18 +21,24 @@ class MoviePlace {
     [[nodiscard]] std::string problem() const;
 
     /** Makes the movie's file. What has its name is kept beside it under its own name and time. Where that fails the
-     *  handle is empty and `problem` has the reason. */
-    [[nodiscard]] FileHandle create(std::string& problem) const;
+     *  handle is empty and `problem` has the reason. Both survive a power cut from then on. */
+    [[nodiscard]] FileHandle create(std::string& problem);
+    /** Undoes that: removes the movie's file if it is still the one that was made, and gives what had its name before
+     *  that name again. */
+    void takeBack();
 
     [[nodiscard]] const std::string& path() const { return m_path; }
 
   private:
     [[nodiscard]] std::string reason(const std::string& what, int error) const;
     [[nodiscard]] bool makeFolders(std::string& problem) const;
-    [[nodiscard]] bool keepExisting(std::string& problem) const;
+    void foldersToDisk() const;
+    [[nodiscard]] bool keepExisting(std::string& problem);
 
     std::string m_path;
     std::string m_folder; ///< the part of the path that must exist
+    std::string m_kept;   ///< where what had the name before is now; empty if nothing had
+    struct stat m_made {};
 };
 
 /** The name, without its folder, under which a movie is kept that was last written at `time` (shown as local time).

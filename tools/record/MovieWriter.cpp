@@ -1,6 +1,5 @@
 #include "tools/record/MovieWriter.h"
 
-#include <cstring>
 #include <utility>
 
 namespace qivo::record {
@@ -133,15 +132,25 @@ void MovieWriter::write(const Fragment& fragment) {
             m_file->setSound(*m_fragmenter.soundFormat());
         }
         if (!m_file->append(fragment)) {
-            fail(std::string("the movie \"") + m_place.path() + "\" ends here: " + std::strerror(m_file->error()));
+            failWriting();
         }
     }
     const std::lock_guard guard(m_mutex);
     m_writingSince.reset();
-    if (m_file) {
+    if (m_file && !m_file->isEmpty()) {
         m_status.pictures = m_file->tables().pictures.size();
         m_status.bytes = m_file->size();
     }
+}
+
+/// Of a movie without anything in it nothing is left behind.
+void MovieWriter::failWriting() {
+    if (m_file->isEmpty()) {
+        m_place.takeBack();
+        fail("cannot record to \"" + m_place.path() + "\": " + m_file->error());
+        return;
+    }
+    fail("the movie \"" + m_place.path() + "\" ends here: " + m_file->error());
 }
 
 void MovieWriter::finishFile() {
@@ -149,11 +158,13 @@ void MovieWriter::finishFile() {
         return;
     }
     if (!m_file->finish()) {
-        fail(std::string("the movie \"") + m_place.path() +
-             "\" is complete, but has no index: " + std::strerror(m_file->error()));
+        fail("the movie \"" + m_place.path() + "\" is complete, but has no index: " + m_file->error());
     }
     const std::lock_guard guard(m_mutex);
     m_status.bytes = m_file->size();
+    if (!m_file->tables().fitsIndex()) {
+        m_status.remark = "the movie \"" + m_place.path() + "\" is too long for an index and stays in fragments";
+    }
 }
 
 void MovieWriter::fail(std::string problem) {

@@ -43,6 +43,7 @@ class MovieWriter {
         Nanoseconds length{};       ///< of what has been put on the time line
         bool diskIsSlow = false;    ///< a single writing has taken long and goes on
         std::string problem;        ///< why writing has ended; empty if it has not
+        std::string remark;         ///< in what the finished movie is not like others; empty if in nothing
     };
     [[nodiscard]] Status status() const;
 
@@ -58,11 +59,12 @@ class MovieWriter {
     void write(const Fragment& fragment);
     void finishFile();
     [[nodiscard]] bool open();
+    void failWriting();
     void fail(std::string problem);
     [[nodiscard]] bool push(Item item, std::size_t bytes, bool wait);
 
-    const MoviePlace m_place;
-    std::optional<MovieFile> m_file; // thread only, as the next two
+    MoviePlace m_place; // thread only, as the next three
+    std::optional<MovieFile> m_file;
     std::optional<PictureFormat> m_picture;
     Fragmenter m_fragmenter;
 
