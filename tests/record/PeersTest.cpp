@@ -4,8 +4,12 @@
 #include <cmath>
 #include <csignal>
 #include <cstdlib>
+#include <cstring>
+#include <fstream>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <iterator>
+#include <sstream>
 
 namespace qivo::test {
 namespace {
@@ -57,6 +61,65 @@ TEST_P(RecorderPeers, FfprobeFfmpegAndMpvReadTheMovieWithoutAComplaint) {
     const Outcome seeked = shell(
         "ffprobe -v error -read_intervals 1%+0.2 -select_streams v -show_entries packet=pts_time -of csv=p=0 " + movie);
     EXPECT_NE(seeked.output, "") << "pictures are found from the middle on";
+}
+
+/// Numbers, one a line.
+std::vector<double> numbersIn(const std::string& text) {
+    std::vector<double> numbers;
+    std::istringstream lines(text);
+    for (std::string line; std::getline(lines, line);) {
+        numbers.push_back(std::atof(line.c_str()));
+    }
+    return numbers;
+}
+
+TEST_P(RecorderPeers, PicturesHaveTheTimesOfTheClockInThem) {
+    RecorderProcess recorder("picture=320x180@30 sound=48000x2 gone=800-1300");
+    const std::string movie = record(recorder, GetParam());
+    const DecodedMovie decoded = recorder.movie();
+    ASSERT_TRUE(decoded.readable) << decoded.error;
+    const auto times = numbersIn(
+        shell("ffprobe -v error -select_streams v -show_entries packet=pts_time -of csv=p=0 " + movie).output);
+    ASSERT_EQ(times.size(), decoded.pictures.size());
+    ASSERT_GE(times.size(), 25U);
+    for (std::size_t i = 0; i < times.size(); ++i) {
+        ASSERT_TRUE(decoded.pictures[i].published && decoded.pictures[0].published);
+        EXPECT_NEAR(times[i] - times[0],
+                    static_cast<double>(*decoded.pictures[i].published - *decoded.pictures[0].published) * 1e-3, 0.040);
+    }
+    const auto length = numbersIn(shell("ffprobe -v error -show_entries format=duration -of csv=p=0 " + movie).output);
+    ASSERT_EQ(length.size(), 1U);
+    EXPECT_GE(length[0], times.back());
+    EXPECT_LE(length[0], times.back() + 0.25);
+}
+
+TEST_P(RecorderPeers, SoundOfAHighRateIsReadWholeAndAtItsRate) {
+    RecorderProcess recorder("picture=320x180@30 sound=96000x2");
+    const std::string movie = record(recorder, GetParam());
+    const Outcome stream = shell("ffprobe -v error -select_streams a -show_entries "
+                                 "stream=codec_name,sample_rate,channels -of csv=p=0 " +
+                                 movie);
+    EXPECT_EQ(stream.output, "pcm_s24be,96000,2\n");
+    const std::string samples = recorder.folder().path("samples");
+    EXPECT_EQ(shell("ffmpeg -v error -i " + movie + " -vn -f f32le -ac 1 " + samples).output, "");
+    std::ifstream file(samples, std::ios::binary);
+    const std::string bytes(std::istreambuf_iterator<char>(file), {});
+    const std::size_t count = bytes.size() / sizeof(float);
+    EXPECT_GE(count, std::size_t{96000} * 12 / 10);
+    EXPECT_LE(count, std::size_t{96000} * 3);
+    // In the first tenth of each second a tone of 1000 Hz: from silence to silence.
+    std::vector<float> values(count);
+    std::memcpy(values.data(), bytes.data(), count * sizeof(float));
+    std::size_t begin = count / 4;
+    while (begin < count && std::abs(values[begin]) < 0.01F) {
+        ++begin;
+    }
+    ASSERT_LT(begin + 9600, count);
+    int rising = 0;
+    for (std::size_t i = begin; i < begin + 9600; ++i) {
+        rising += values[i - 1] <= 0 && values[i] > 0 ? 1 : 0;
+    }
+    EXPECT_NEAR(rising, 100, 1);
 }
 
 INSTANTIATE_TEST_SUITE_P(FinishedAndKilled, RecorderPeers, testing::Bool());

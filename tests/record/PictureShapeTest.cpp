@@ -1,12 +1,17 @@
 #include "tools/record/PictureShape.h"
 #include "tools/record/EncoderChoice.h"
 
+#include "tools/record/PictureFitter.h"
+
 #include <cmath>
+#include <gmock/gmock.h>
 #include <gst/gst.h>
 #include <gtest/gtest.h>
 
 namespace qivo::record {
 namespace {
+
+using testing::MatchesRegex;
 
 QIVOlib_video_frame_v2_t frame(int width, int height, float aspect = 0) {
     QIVOlib_video_frame_v2_t frame{};
@@ -56,9 +61,13 @@ TEST(PictureArea, OtherAspectsStandBetweenBars) {
     EXPECT_EQ(areaFor(20, {16, 16, 1, 1, 30, 1}).height, 2) << "never nothing";
 }
 
+const PictureShape kSmall{320, 180, 1, 1, 30, 1};
+const std::atomic<bool> kGoesOn = false;
+// Nothing comes out of it, not even an end.
+const EncoderCandidate kHangs{"x264enc", "! valve drop=true", true};
+
 TEST(EncoderChoice, TheFirstThatWorksIsTaken) {
     gst_init(nullptr, nullptr);
-    const PictureShape shape{320, 180, 1, 1, 30, 1};
     const std::vector<EncoderCandidate> candidates = {
         {"no-such-encoder", "", true},
         {"identity", "", true},             // there, but encodes nothing
@@ -66,15 +75,77 @@ TEST(EncoderChoice, TheFirstThatWorksIsTaken) {
         {"x264enc", "key-int-max=7", true}, // tried like hardware
         {"x264enc", "", false},
     };
-    EXPECT_EQ(chooseEncoder(candidates, shape), &candidates[3]);
-    EXPECT_EQ(chooseEncoder({candidates[0], candidates[1]}, shape), nullptr);
+    const EncoderChoice choice = chooseEncoder(candidates, kSmall, kGoesOn);
+    ASSERT_TRUE(choice.encoder);
+    EXPECT_EQ(choice.encoder->properties, "key-int-max=7");
+    EXPECT_THAT(choice.passedOver, MatchesRegex("identity \\(.+\\), x264enc \\(no property \"no-such\" in .*\\)"))
+        << "and nothing of what is not installed";
+    EXPECT_FALSE(chooseEncoder({candidates[0], candidates[1]}, kSmall, kGoesOn).encoder);
+}
+
+TEST(EncoderChoice, OneThatFailsOrSwallowsPicturesIsPassedOverAtOnce) {
+    gst_init(nullptr, nullptr);
+    const auto began = std::chrono::steady_clock::now();
+    const EncoderChoice choice = chooseEncoder(
+        {{"x264enc", "! identity error-after=2", true}, {"x264enc", "! identity drop-probability=1", true}}, kSmall,
+        kGoesOn);
+    EXPECT_LT(std::chrono::steady_clock::now() - began, trialLimit);
+    EXPECT_FALSE(choice.encoder);
+    EXPECT_THAT(choice.passedOver, MatchesRegex("x264enc \\(Failed after .*\\), x264enc \\(swallows pictures\\)"));
+}
+
+TEST(EncoderChoice, AllThatHangTakeNoLongerThanOne) {
+    gst_init(nullptr, nullptr);
+    const auto began = std::chrono::steady_clock::now();
+    const EncoderChoice choice = chooseEncoder({kHangs, kHangs, kHangs, {"x264enc", "", false}}, kSmall, kGoesOn);
+    EXPECT_LT(std::chrono::steady_clock::now() - began, 2 * trialLimit);
+    ASSERT_TRUE(choice.encoder);
+    EXPECT_FALSE(choice.encoder->hardware);
+    EXPECT_EQ(choice.passedOver, "x264enc (takes too long), x264enc (takes too long), x264enc (takes too long)");
+}
+
+TEST(EncoderChoice, ATrialEndsWhenItIsNotWantedAnyMore) {
+    gst_init(nullptr, nullptr);
+    const std::atomic<bool> stopped = true;
+    const auto began = std::chrono::steady_clock::now();
+    EXPECT_FALSE(chooseEncoder({kHangs}, kSmall, stopped).encoder);
+    EXPECT_LT(std::chrono::steady_clock::now() - began, trialLimit / 2);
 }
 
 TEST(EncoderChoice, ThereIsOneOnThisMachine) {
     gst_init(nullptr, nullptr);
     const PictureShape shape{1920, 1080, 1, 1, 30, 1};
-    const auto candidates = encoderCandidates(shape, 2);
-    EXPECT_NE(chooseEncoder(candidates, shape), nullptr);
+    EXPECT_TRUE(chooseEncoder(encoderCandidates(shape, 2), shape, kGoesOn).encoder);
+}
+
+/// Those of hardware exist only where the hardware does.
+TEST(EncoderChoice, EveryElementTakesItsProperties) {
+    gst_init(nullptr, nullptr);
+    int parsed = 0;
+    for (const unsigned processors : {1U, 2U, 16U}) {
+        for (const EncoderCandidate& candidate : encoderCandidates(kSmall, processors)) {
+            const Media<GstElementFactory> factory(gst_element_factory_find(candidate.element.c_str()));
+            if (!factory) {
+                continue;
+            }
+            GError* error = nullptr;
+            const Media<GstElement> pipeline(gst_parse_launch(encoderPipeline(candidate).c_str(), &error));
+            const Media<GError> owned(error);
+            EXPECT_FALSE(owned) << candidate.element << ": " << owned->message;
+            ++parsed;
+        }
+    }
+    EXPECT_GE(parsed, 3);
+}
+
+TEST(PictureFitter, NoMoreThanPartOfASecondWaitsForTheEncoder) {
+    EXPECT_EQ(PictureFitter::mostWaiting({160, 90, 1, 1, 30, 1}), 12U);
+    EXPECT_EQ(PictureFitter::mostWaiting({1920, 1080, 1, 1, 30, 1}), 12U);
+    EXPECT_EQ(PictureFitter::mostWaiting({1920, 1080, 1, 1, 60000, 1001}), 24U);
+    EXPECT_EQ(PictureFitter::mostWaiting({3840, 2160, 1, 1, 60, 1}), 8U) << "as many as the memory holds";
+    EXPECT_EQ(PictureFitter::mostWaiting({320, 180, 1, 1, 1000, 1}), 24U);
+    EXPECT_EQ(PictureFitter::mostWaiting({320, 180, 1, 1, 1, 1}), 6U);
+    EXPECT_EQ(PictureFitter::mostWaiting({8192, 8192, 1, 1, 30, 1}), 6U);
 }
 
 } // namespace

@@ -45,6 +45,15 @@ void RecorderProcess::closeInput() {
     }
 }
 
+std::string RecorderProcess::complaints() const {
+    std::string errors = m_process->errors();
+    const std::size_t begin = errors.find("Application.Mac.QIVO.Recording: encoding with ");
+    if (begin != std::string::npos) {
+        errors.erase(begin, errors.find('\n', begin) + 1 - begin);
+    }
+    return errors;
+}
+
 std::string RecorderProcess::lastProgress() const {
     const std::string output = m_process->output();
     const std::size_t end = output.rfind('\n');

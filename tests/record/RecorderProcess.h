@@ -32,6 +32,8 @@ class RecorderProcess {
     /// How long the last interrupting took.
     std::chrono::milliseconds ending() const { return m_ending; }
     void closeInput();
+    /// What it has said on its standard error but which encoder it took.
+    std::string complaints() const;
     /// The last whole line of its progress.
     std::string lastProgress() const;
     /// How long the progress says that the movie is.

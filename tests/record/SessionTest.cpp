@@ -1,11 +1,13 @@
 // A recording in this process, so that its time is the test's.
 #include "tests/platform/TemporaryDirectory.h"
 #include "tests/record/MovieReader.h"
+#include "tests/record/SlowDisk.h"
 #include "tests/support/Screen.h"
 #include "tools/record/Recorder.h"
 
 #include <cstdlib>
 #include <filesystem>
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 namespace qivo::record {
@@ -16,14 +18,27 @@ using std::chrono::seconds;
 
 class SessionTest : public testing::Test {
   protected:
+    /// These encoders are there in the place of all others.
+    void start(const std::string& script, const std::vector<EncoderCandidate>& encoders) {
+        m_encoders = encoders;
+        start(script);
+    }
     void start(const std::string& script) {
         setenv("QIVO_STAND_IN", script.c_str(), 1);
         gst_init(nullptr, nullptr);
-        m_recorder.emplace(Recorder::Settings{"A"}, MoviePlace("A", m_path));
+        Recorder::Settings settings{"A"};
+        if (!m_encoders.empty()) {
+            settings.encoders = [this](const PictureShape&, unsigned) { return m_encoders; };
+        }
+        m_recorder.emplace(settings, MoviePlace("A", m_path));
+    }
+    bool waitsFor(const std::string& what) {
+        return test::eventually([&] { return m_recorder->progress(steadyNow()).waiting == what; });
     }
 
     TemporaryDirectory m_folder;
     std::string m_path = m_folder.path("A.mov");
+    std::vector<EncoderCandidate> m_encoders;
     std::optional<Recorder> m_recorder;
 };
 
@@ -57,6 +72,85 @@ TEST_F(SessionTest, AFolderThatGoesBeforeTheFirstPictureIsAFailure) {
     start("picture=160x90@30");
     EXPECT_TRUE(test::eventually([&] { return m_recorder->state(steadyNow()) == Recorder::State::failed; }));
     EXPECT_EQ(m_recorder->problem(), "cannot record to \"" + m_path + "\": No such file or directory");
+}
+
+TEST_F(SessionTest, AnEncoderThatFailsEndsTheRecordingAndTheMoviePlaysUpToThere) {
+    start("picture=160x90@30",
+          {{"x264enc", "speed-preset=ultrafast tune=zerolatency ! identity error-after=21", false}});
+    EXPECT_TRUE(test::eventually([&] { return m_recorder->state(steadyNow()) == Recorder::State::failed; }));
+    const std::string problem = m_recorder->problem();
+    EXPECT_THAT(problem, testing::StartsWith("the encoder x264enc has failed: "));
+    m_recorder->finish();
+    EXPECT_EQ(m_recorder->problem(), problem) << "however often it is asked for";
+    const auto movie = test::decodeMovie(m_path);
+    EXPECT_TRUE(movie.readable) << movie.error;
+    EXPECT_NEAR(static_cast<double>(movie.pictures.size()), 20, 1);
+}
+
+TEST_F(SessionTest, AnEncoderThatIsBehindIsToldAndEveryPictureThatItCostsIsCounted) {
+    // It takes a fifth of a second each, and half a second for the rest when it is to end.
+    start("picture=160x90@30 until=1000",
+          {{"x264enc", "speed-preset=ultrafast tune=zerolatency ! identity sleep-time=200000", false}});
+    EXPECT_TRUE(waitsFor("the encoder"));
+    EXPECT_TRUE(waitsFor("the source to come back"));
+    const auto began = std::chrono::steady_clock::now();
+    m_recorder->finish();
+    EXPECT_LT(std::chrono::steady_clock::now() - began, seconds(1));
+    EXPECT_EQ(m_recorder->problem(), "");
+    const Progress progress = m_recorder->progress(steadyNow());
+    EXPECT_GE(progress.dropped, 10U);
+    EXPECT_EQ(progress.pictures + progress.dropped, 30U);
+    const auto movie = test::decodeMovie(m_path);
+    EXPECT_TRUE(movie.readable) << movie.error;
+    EXPECT_EQ(movie.pictures.size(), progress.pictures);
+}
+
+TEST_F(SessionTest, HardwareThatHangsIsPassedOverAndNamed) {
+    start("picture=160x90@30", {{"x264enc", "! valve drop=true", true}, {"x264enc", "speed-preset=ultrafast", false}});
+    EXPECT_TRUE(test::eventually([&] { return m_recorder->progress(steadyNow()).pictures > 10; }));
+    EXPECT_EQ(m_recorder->encoder(), "encoding with x264enc; not with x264enc (takes too long)");
+    m_recorder->finish();
+    EXPECT_EQ(m_recorder->problem(), "");
+}
+
+TEST_F(SessionTest, HardwareOnTrialDoesNotHoldTheEndUp) {
+    start("picture=160x90@30", {{"x264enc", "! valve drop=true", true}});
+    EXPECT_TRUE(waitsFor("")); // the first picture has come
+    const auto began = std::chrono::steady_clock::now();
+    m_recorder->finish();
+    EXPECT_LT(std::chrono::steady_clock::now() - began, trialLimit / 2);
+    EXPECT_THAT(m_recorder->problem(), testing::HasSubstr("there is no H.264 encoder"));
+    EXPECT_EQ(m_recorder->encoder(), "not with x264enc (takes too long)");
+}
+
+TEST_F(SessionTest, ASlowDiskIsToldAndTheSoundThatItCostsIsCounted) {
+    start("sound=384000x16");
+    ASSERT_TRUE(test::eventually([&] { return m_recorder->progress(steadyNow()).bytes > 0; }));
+    EXPECT_EQ(m_recorder->progress(steadyNow()).soundLost, Nanoseconds(0));
+    {
+        const test::SlowDisk disk;
+        EXPECT_TRUE(waitsFor("the disk"));
+        // 64 MB are three and a half seconds of it.
+        EXPECT_TRUE(test::eventually([&] { return m_recorder->progress(steadyNow()).soundLost > milliseconds(50); }));
+    }
+    m_recorder->finish();
+    EXPECT_EQ(m_recorder->problem(), "");
+}
+
+TEST_F(SessionTest, PicturesThatStopWhileTheSoundGoesOnAreWaitedFor) {
+    start("picture=160x90@30 sound=8000x1 gone=500-9000 sound-stays");
+    ASSERT_TRUE(test::eventually([&] { return m_recorder->progress(steadyNow()).pictures > 0; }));
+    EXPECT_EQ(m_recorder->progress(steadyNow()).waiting, "");
+    EXPECT_TRUE(waitsFor("a picture"));
+    m_recorder->finish();
+}
+
+TEST_F(SessionTest, PicturesThatCannotBeReadAreCountedAndNamed) {
+    start("picture=160x90@30 unreadable=500");
+    EXPECT_TRUE(waitsFor("a picture that can be read"));
+    EXPECT_GT(m_recorder->progress(steadyNow()).dropped, 0U);
+    m_recorder->finish();
+    EXPECT_EQ(test::decodeMovie(m_path).pictures.size(), 15U);
 }
 
 } // namespace

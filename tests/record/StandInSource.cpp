@@ -5,6 +5,8 @@
 //   resize=MS:WxH       another size from MS milliseconds on
 //   rate=MS:R           another rate of sound from then on
 //   gone=FROM-TO        nothing comes in that time, and stamps begin anew after it
+//   sound-stays         that goes for pictures only
+//   unreadable=MS       pictures are of a form that nobody has asked for from then on
 //   until=MS            nothing comes any more from then on
 //   jitter=MS           pictures come up to so much late, each by another time
 //   late=MS             pictures come so much late
@@ -58,6 +60,8 @@ struct Script {
     int late = 0;
     long clockFrom = -1;
     bool noise = false;
+    bool soundStays = false;
+    long unreadableFrom = -1;
 };
 
 Script readScript() {
@@ -75,7 +79,9 @@ Script readScript() {
         std::sscanf(form, "jitter=%d", &script.jitter);
         std::sscanf(form, "late=%d", &script.late);
         std::sscanf(form, "clock=%ld", &script.clockFrom);
+        std::sscanf(form, "unreadable=%ld", &script.unreadableFrom);
         script.noise = script.noise || word == "noise";
+        script.soundStays = script.soundStays || word == "sound-stays";
     }
     return script;
 }
@@ -114,7 +120,8 @@ struct Receiver {
             script.late + (script.jitter > 0 ? static_cast<int>(random() % static_cast<unsigned>(script.jitter)) : 0));
     }
     bool comes(long ms) const {
-        return (ms < script.goneFrom || ms >= script.goneTo) && (script.until < 0 || ms < script.until);
+        return ((sound && script.soundStays) || ms < script.goneFrom || ms >= script.goneTo) &&
+               (script.until < 0 || ms < script.until);
     }
     /// Counts anew after a break.
     std::int64_t stampOf(std::int64_t frame) const {
@@ -187,6 +194,9 @@ int32_t givePicture(Receiver& receiver, QIVOlib_video_frame_v2_t& frame, std::in
     frame.yres = resized ? script.resizedHeight : script.height;
     receiver.fillPicture(frame.xres, frame.yres, due, ms % 1000 < 100);
     frame.FourCC = 'R' | 'G' << 8 | 'B' << 16 | 'A' << 24;
+    if (script.unreadableFrom >= 0 && ms >= script.unreadableFrom) {
+        frame.FourCC = 'U' | 'Y' << 8 | 'V' << 16 | 'Y' << 24;
+    }
     frame.frame_rate_N = script.rate;
     frame.frame_rate_D = 1;
     frame.picture_aspect_ratio = static_cast<float>(frame.xres) / static_cast<float>(frame.yres);

@@ -226,6 +226,42 @@ TEST_F(FragmenterTest, SlowPicturesKeepTheirTimes) {
     EXPECT_LE(first.pictures[0].start + first.pictures[0].duration, second.pictures[0].start);
 }
 
+TEST_F(FragmenterTest, PicturesThatAreLateInComingKeepTheirTimes) {
+    for (int i = 0; i < 4; ++i) {
+        picture(seconds(50) + i * milliseconds(40));
+    }
+    const Fragment first = m_fragmenter.take(seconds(50) + milliseconds(600));
+    ASSERT_EQ(first.pictures.size(), 4U) << "nobody knows whether another one will come";
+    for (int i = 4; i < 20; ++i) {
+        picture(seconds(50) + i * milliseconds(40), seconds(50) + milliseconds(700 + i));
+    }
+    const Fragment second = m_fragmenter.takeAll();
+    ASSERT_EQ(second.pictures.size(), 16U);
+    for (std::size_t i = 0; i < 16; ++i) {
+        EXPECT_EQ(second.pictures[i].start, static_cast<std::int64_t>(i + 4) * 3600);
+        EXPECT_EQ(second.pictures[i].duration, 3600U);
+    }
+}
+
+TEST_F(FragmenterTest, AGapIsNotTakenForTheUsual) {
+    picture(seconds(50));
+    picture(seconds(80));
+    const Fragment fragment = m_fragmenter.take(seconds(81));
+    ASSERT_EQ(fragment.pictures.size(), 2U);
+    EXPECT_LE(fragment.pictures[1].duration, 18000U);
+    picture(seconds(80) + milliseconds(200), seconds(82));
+    EXPECT_EQ(m_fragmenter.takeAll().pictures.at(0).start, 30 * 90000 + 18000);
+}
+
+TEST_F(FragmenterTest, APictureThatStandsForHoursHasALongDurationAndTheNextItsTime) {
+    picture(seconds(50));
+    picture(seconds(50) + std::chrono::hours(14));
+    const Fragment fragment = m_fragmenter.takeAll();
+    ASSERT_EQ(fragment.pictures.size(), 2U);
+    EXPECT_EQ(fragment.pictures[0].duration, 0x7FFFFFFFU);
+    EXPECT_EQ(fragment.pictures[1].start, 14LL * 3600 * 90000);
+}
+
 TEST_F(FragmenterTest, TheMovieBeginsWithTheFirstPictureAndSoundBeforeItIsCut) {
     for (int i = 0; i < 20; ++i) {
         sound(seconds(50) + i * milliseconds(10));
@@ -309,6 +345,9 @@ TEST(ProgressLine, SaysTimePicturesDroppedBytesAndWhyItWaits) {
     progress.waiting = "the source";
     EXPECT_EQ(progressLine(progress),
               "time 26:03:04.056 pictures 12345 dropped 6 bytes 789000000000 waiting for the source");
+    progress.soundLost = milliseconds(1250);
+    EXPECT_EQ(progressLine(progress), "time 26:03:04.056 pictures 12345 dropped 6 bytes 789000000000 sound lost "
+                                      "00:00:01.250 waiting for the source");
 }
 
 } // namespace

@@ -9,7 +9,7 @@ namespace qivo::record {
 namespace {
 
 constexpr int trialPictures = 3;
-constexpr GstClockTime trialLimit = 2 * GST_SECOND;
+constexpr GstClockTime trialStep = 20 * GST_MSECOND;
 constexpr double manyPixels = 1280.0 * 720 * 30; ///< a second
 constexpr unsigned fewProcessors = 4;
 
@@ -31,12 +31,7 @@ std::string x264Properties(const PictureShape& shape, unsigned processors) {
 }
 
 bool isInstalled(const std::string& element) {
-    GstElementFactory* factory = gst_element_factory_find(element.c_str());
-    if (factory == nullptr) {
-        return false;
-    }
-    gst_object_unref(factory);
-    return true;
+    return Media<GstElementFactory>(gst_element_factory_find(element.c_str())) != nullptr;
 }
 
 void pushTrial(GstElement* pipeline, const PictureShape& shape) {
@@ -53,22 +48,41 @@ void pushTrial(GstElement* pipeline, const PictureShape& shape) {
     gst_app_src_end_of_stream(GST_APP_SRC(in.get()));
 }
 
-bool works(const EncoderCandidate& candidate, const PictureShape& shape) {
+/// Why the pipeline has failed; empty if it has not.
+std::string failureOf(GstElement* pipeline) {
+    const Media<GstBus> bus(gst_element_get_bus(pipeline));
+    const Media<GstMessage> message(gst_bus_pop_filtered(bus.get(), GST_MESSAGE_ERROR));
+    return message ? errorText(message.get()) : "";
+}
+
+/// Why it does not encode a few pictures; empty if it does.
+std::string trial(const EncoderCandidate& candidate, const PictureShape& shape,
+                  std::chrono::steady_clock::time_point limit, const std::atomic<bool>& stopped) {
     GError* error = nullptr;
     const Media<GstElement> pipeline(gst_parse_launch(encoderPipeline(candidate).c_str(), &error));
     const Media<GError> owned(error);
     if (!pipeline || owned) {
-        return false;
+        return owned ? owned->message : "cannot be made";
     }
     gst_element_set_state(pipeline.get(), GST_STATE_PLAYING);
     pushTrial(pipeline.get(), shape);
     const Media<GstElement> out(gst_bin_get_by_name(GST_BIN(pipeline.get()), "out"));
     int pictures = 0;
-    while (const Media<GstSample> sample{gst_app_sink_try_pull_sample(GST_APP_SINK(out.get()), trialLimit)}) {
-        ++pictures;
+    std::string failure;
+    while (pictures < trialPictures && failure.empty()) {
+        if (const Media<GstSample> sample{gst_app_sink_try_pull_sample(GST_APP_SINK(out.get()), trialStep)}) {
+            ++pictures;
+            continue;
+        }
+        failure = failureOf(pipeline.get());
+        if (failure.empty() && gst_app_sink_is_eos(GST_APP_SINK(out.get()))) {
+            failure = "swallows pictures";
+        } else if (failure.empty() && (stopped || std::chrono::steady_clock::now() >= limit)) {
+            failure = "takes too long";
+        }
     }
     gst_element_set_state(pipeline.get(), GST_STATE_NULL);
-    return pictures == trialPictures;
+    return failure;
 }
 
 } // namespace
@@ -92,13 +106,22 @@ std::string encoderPipeline(const EncoderCandidate& encoder) {
            " ! h264parse ! video/x-h264,stream-format=avc,alignment=au ! appsink name=out sync=false";
 }
 
-const EncoderCandidate* chooseEncoder(const std::vector<EncoderCandidate>& candidates, const PictureShape& shape) {
+EncoderChoice chooseEncoder(const std::vector<EncoderCandidate>& candidates, const PictureShape& shape,
+                            const std::atomic<bool>& stopped) {
+    const auto limit = std::chrono::steady_clock::now() + trialLimit;
+    EncoderChoice choice;
     for (const EncoderCandidate& candidate : candidates) {
-        if (isInstalled(candidate.element) && (!candidate.hardware || works(candidate, shape))) {
-            return &candidate;
+        if (!isInstalled(candidate.element)) {
+            continue;
         }
+        const std::string failure = candidate.hardware ? trial(candidate, shape, limit, stopped) : "";
+        if (failure.empty()) {
+            choice.encoder = candidate;
+            return choice;
+        }
+        choice.passedOver += (choice.passedOver.empty() ? "" : ", ") + candidate.element + " (" + failure + ")";
     }
-    return nullptr;
+    return choice;
 }
 
 } // namespace qivo::record

@@ -4,11 +4,13 @@
 #include <gst/video/video.h>
 
 #include <memory>
+#include <string>
 
 namespace qivo::record {
 
 struct MediaRelease {
     void operator()(GstElement* element) const { gst_object_unref(element); }
+    void operator()(GstElementFactory* factory) const { gst_object_unref(factory); }
     void operator()(GstBus* bus) const { gst_object_unref(bus); }
     void operator()(GstBufferPool* pool) const { gst_object_unref(pool); }
     void operator()(GstCaps* caps) const { gst_caps_unref(caps); }
@@ -22,5 +24,13 @@ struct MediaRelease {
 /** One reference to, or the only owner of, something of GStreamer's. */
 template <typename T>
 using Media = std::unique_ptr<T, MediaRelease>;
+
+/** What an error message says. */
+[[nodiscard]] inline std::string errorText(GstMessage* message) {
+    GError* error = nullptr;
+    gst_message_parse_error(message, &error, nullptr);
+    const Media<GError> owned(error);
+    return owned->message;
+}
 
 } // namespace qivo::record

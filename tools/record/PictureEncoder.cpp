@@ -1,6 +1,6 @@
 #include "tools/record/PictureEncoder.h"
 
-#include <thread>
+#include <algorithm>
 #include <utility>
 
 namespace qivo::record {
@@ -24,19 +24,14 @@ struct PictureEncoder::Callbacks {
     }
 };
 
-std::unique_ptr<PictureEncoder> PictureEncoder::create(const PictureShape& shape, Calls calls, std::string& problem) {
-    const auto candidates = encoderCandidates(shape, std::thread::hardware_concurrency());
-    const EncoderCandidate* chosen = chooseEncoder(candidates, shape);
-    if (chosen == nullptr) {
-        problem = "there is no H.264 encoder for GStreamer (Debian: gstreamer1.0-plugins-ugly)";
+std::unique_ptr<PictureEncoder> PictureEncoder::create(const PictureShape& shape, const EncoderCandidate& encoder,
+                                                       Calls calls, std::string& problem) {
+    std::unique_ptr<PictureEncoder> created(new PictureEncoder(shape, std::move(calls)));
+    if (!created->start(encoder)) {
+        problem = "the encoder " + encoder.element + " cannot be started";
         return nullptr;
     }
-    std::unique_ptr<PictureEncoder> encoder(new PictureEncoder(shape, std::move(calls)));
-    if (!encoder->start(*chosen)) {
-        problem = "the encoder " + chosen->element + " cannot be started";
-        return nullptr;
-    }
-    return encoder;
+    return created;
 }
 
 PictureEncoder::PictureEncoder(const PictureShape& shape, Calls calls)
@@ -67,37 +62,55 @@ bool PictureEncoder::start(const EncoderCandidate& encoder) {
     return m_running;
 }
 
-bool PictureEncoder::encode(const QIVOlib_video_frame_v2_t& frame, Nanoseconds time) {
+PictureEncoder::Taken PictureEncoder::encode(const QIVOlib_video_frame_v2_t& frame, Nanoseconds time) {
+    if (!PictureFitter::isReadable(frame)) {
+        return Taken::unreadable;
+    }
     Media<GstBuffer> picture = m_running ? m_fitter.fit(frame) : nullptr;
     if (!picture) {
-        return false;
+        return Taken::behind;
     }
     GST_BUFFER_PTS(picture.get()) = static_cast<GstClockTime>(time.count());
-    return gst_app_src_push_buffer(GST_APP_SRC(m_in.get()), picture.release()) == GST_FLOW_OK;
+    if (gst_app_src_push_buffer(GST_APP_SRC(m_in.get()), picture.release()) != GST_FLOW_OK) {
+        return Taken::behind;
+    }
+    ++m_taken;
+    return Taken::yes;
 }
 
-void PictureEncoder::finish(Nanoseconds limit) {
+std::uint64_t PictureEncoder::finish(Nanoseconds limit) {
     if (!m_running) {
-        return;
+        return 0;
     }
     m_running = false;
     gst_app_src_end_of_stream(GST_APP_SRC(m_in.get()));
     const Media<GstBus> bus(gst_element_get_bus(m_pipeline.get()));
+    const bool failed = !problem().empty();
     const Media<GstMessage> ended(
-        gst_bus_timed_pop_filtered(bus.get(), static_cast<GstClockTime>(limit.count()),
+        gst_bus_timed_pop_filtered(bus.get(), failed ? 0 : static_cast<GstClockTime>(limit.count()),
                                    static_cast<GstMessageType>(GST_MESSAGE_EOS | GST_MESSAGE_ERROR)));
+    if (ended && GST_MESSAGE_TYPE(ended.get()) == GST_MESSAGE_ERROR) {
+        noteFailure(ended.get());
+    }
+    m_ended = true;
+    return m_taken - std::min<std::uint64_t>(m_taken, m_handedOn);
+}
+
+void PictureEncoder::noteFailure(GstMessage* message) const {
+    const std::lock_guard guard(m_mutex);
+    if (m_problem.empty()) {
+        m_problem = "the encoder " + m_element + " has failed: " + errorText(message);
+    }
 }
 
 std::string PictureEncoder::problem() const {
     const Media<GstBus> bus(gst_element_get_bus(m_pipeline.get()));
     const Media<GstMessage> message(gst_bus_pop_filtered(bus.get(), GST_MESSAGE_ERROR));
-    if (!message) {
-        return {};
+    if (message) {
+        noteFailure(message.get());
     }
-    GError* error = nullptr;
-    gst_message_parse_error(message.get(), &error, nullptr);
-    const Media<GError> owned(error);
-    return "the encoder " + m_element + " has failed: " + owned->message;
+    const std::lock_guard guard(m_mutex);
+    return m_problem;
 }
 
 void PictureEncoder::handOnFormat(GstSample* sample) {
@@ -112,6 +125,9 @@ void PictureEncoder::handOnFormat(GstSample* sample) {
 }
 
 void PictureEncoder::handOn(GstSample* sample) {
+    if (m_ended) {
+        return;
+    }
     if (!m_formatKnown) {
         handOnFormat(sample);
     }
@@ -122,6 +138,7 @@ void PictureEncoder::handOn(GstSample* sample) {
     if (m_formatKnown && GST_CLOCK_TIME_IS_VALID(time)) {
         m_calls.picture({bytesOf(buffer), Nanoseconds(static_cast<std::int64_t>(time)),
                          !GST_BUFFER_FLAG_IS_SET(buffer, GST_BUFFER_FLAG_DELTA_UNIT)});
+        ++m_handedOn;
     }
 }
 

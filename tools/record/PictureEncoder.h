@@ -8,8 +8,10 @@
 #include <gst/app/app.h>
 
 #include <atomic>
+#include <cstdint>
 #include <functional>
 #include <memory>
+#include <mutex>
 #include <string>
 
 namespace qivo::record {
@@ -23,22 +25,28 @@ class PictureEncoder {
         std::function<void(CodedPicture)> picture;
     };
 
-    /** Null, with the reason, if this machine has no encoder that works. */
-    [[nodiscard]] static std::unique_ptr<PictureEncoder> create(const PictureShape& shape, Calls calls,
-                                                                std::string& problem);
+    /** Null, with the reason, if that encoder cannot be started. */
+    [[nodiscard]] static std::unique_ptr<PictureEncoder>
+    create(const PictureShape& shape, const EncoderCandidate& encoder, Calls calls, std::string& problem);
     ~PictureEncoder();
     PictureEncoder(const PictureEncoder&) = delete;
     PictureEncoder& operator=(const PictureEncoder&) = delete;
 
-    /** Takes a picture that belongs at that time, later than the one before. False if the encoder is so far behind that
-     *  it is left out. The frame can be given back after. */
-    [[nodiscard]] bool encode(const QIVOlib_video_frame_v2_t& frame, Nanoseconds time);
-    /** Waits until all that was taken has been handed on, but not longer than `limit`. Nothing can be encoded after. */
-    void finish(Nanoseconds limit);
+    /** What becomes of a picture. */
+    enum class Taken {
+        yes,
+        behind,    ///< left out, since the encoder is so far behind
+        unreadable ///< left out, since it is in no form that can be read
+    };
+    /** Takes a picture that belongs at that time, later than the one before. The frame can be given back after. */
+    [[nodiscard]] Taken encode(const QIVOlib_video_frame_v2_t& frame, Nanoseconds time);
+    /** Waits until all that was taken has been handed on, but not longer than `limit`. Nothing is encoded or handed on
+     *  after. How many pictures were taken and will not be handed on. */
+    std::uint64_t finish(Nanoseconds limit);
 
     /** The name of the encoder's element. */
     [[nodiscard]] const std::string& element() const { return m_element; }
-    /** Why encoding has ended; empty if it has not. Thread: any. */
+    /** Why encoding has ended by itself; empty if it has not. Thread: any. */
     [[nodiscard]] std::string problem() const;
 
   private:
@@ -46,6 +54,7 @@ class PictureEncoder {
 
     PictureEncoder(const PictureShape& shape, Calls calls);
     [[nodiscard]] bool start(const EncoderCandidate& encoder);
+    void noteFailure(GstMessage* message) const;
     void handOn(GstSample* sample);
     void handOnFormat(GstSample* sample);
 
@@ -55,6 +64,11 @@ class PictureEncoder {
     PictureFitter m_fitter;
     bool m_formatKnown = false; // appsink's thread only
     bool m_running = false;
+    std::uint64_t m_taken = 0;
+    std::atomic<std::uint64_t> m_handedOn = 0;
+    std::atomic<bool> m_ended = false; // nothing is handed on any more
+    mutable std::mutex m_mutex;        // protects the next
+    mutable std::string m_problem;     // the bus tells it once
     Media<GstElement> m_pipeline;
     Media<GstElement> m_in;
     Media<GstElement> m_out;

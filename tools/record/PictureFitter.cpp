@@ -3,12 +3,14 @@
 #include "tools/record/SampleDescription.h"
 
 #include <algorithm>
+#include <cmath>
 
 namespace qivo::record {
 namespace {
 
 constexpr std::uint32_t rgba = 'R' | 'G' << 8 | 'B' << 16 | static_cast<std::uint32_t>('A') << 24;
 constexpr guint opaqueBlack = 0xFF000000U;
+constexpr guint conversionThreads = 2; // of large pictures; it keeps the next one from being captured
 
 GstVideoInfo movieFormat(const PictureShape& shape) {
     GstVideoInfo info;
@@ -24,13 +26,12 @@ GstVideoInfo movieFormat(const PictureShape& shape) {
     return info;
 }
 
-Media<GstBufferPool> poolFor(const GstVideoInfo& info) {
+Media<GstBufferPool> poolFor(const GstVideoInfo& info, std::size_t most) {
     const std::size_t size = GST_VIDEO_INFO_SIZE(&info);
-    const auto most = static_cast<guint>(std::max(PictureFitter::fewestPictures, PictureFitter::mostBytes / size));
     Media<GstBufferPool> pool(gst_buffer_pool_new());
     const Media<GstCaps> caps(gst_video_info_to_caps(&info));
     GstStructure* settings = gst_buffer_pool_get_config(pool.get());
-    gst_buffer_pool_config_set_params(settings, caps.get(), static_cast<guint>(size), 0, most);
+    gst_buffer_pool_config_set_params(settings, caps.get(), static_cast<guint>(size), 0, static_cast<guint>(most));
     if (!gst_buffer_pool_set_config(pool.get(), settings) || !gst_buffer_pool_set_active(pool.get(), TRUE)) {
         return nullptr;
     }
@@ -40,7 +41,7 @@ Media<GstBufferPool> poolFor(const GstVideoInfo& info) {
 } // namespace
 
 PictureFitter::PictureFitter(const PictureShape& shape)
-    : m_shape(shape), m_format(movieFormat(shape)), m_pool(poolFor(m_format)) {}
+    : m_shape(shape), m_format(movieFormat(shape)), m_pool(poolFor(m_format, mostWaiting(shape))) {}
 
 PictureFitter::~PictureFitter() {
     if (m_pool) {
@@ -68,15 +69,26 @@ bool PictureFitter::prepare(const QIVOlib_video_frame_v2_t& frame) {
         "settings", GST_VIDEO_CONVERTER_OPT_DEST_X, G_TYPE_INT, input.area.x, GST_VIDEO_CONVERTER_OPT_DEST_Y,
         G_TYPE_INT, input.area.y, GST_VIDEO_CONVERTER_OPT_DEST_WIDTH, G_TYPE_INT, input.area.width,
         GST_VIDEO_CONVERTER_OPT_DEST_HEIGHT, G_TYPE_INT, input.area.height, GST_VIDEO_CONVERTER_OPT_FILL_BORDER,
-        G_TYPE_BOOLEAN, TRUE, GST_VIDEO_CONVERTER_OPT_BORDER_ARGB, G_TYPE_UINT, opaqueBlack, nullptr);
+        G_TYPE_BOOLEAN, TRUE, GST_VIDEO_CONVERTER_OPT_BORDER_ARGB, G_TYPE_UINT, opaqueBlack,
+        GST_VIDEO_CONVERTER_OPT_THREADS, G_TYPE_UINT, conversionThreads, nullptr);
     m_converter.reset(gst_video_converter_new(&m_inputFormat, &m_format, settings));
     return m_converter != nullptr;
 }
 
+std::size_t PictureFitter::mostWaiting(const PictureShape& shape) {
+    const double rate = static_cast<double>(shape.rateN) / shape.rateD;
+    const auto timely = static_cast<std::size_t>(std::ceil(rate * mostSeconds));
+    const GstVideoInfo info = movieFormat(shape);
+    return std::clamp(std::min(timely, mostBytes / GST_VIDEO_INFO_SIZE(&info)), fewestPictures, mostPictures);
+}
+
+bool PictureFitter::isReadable(const QIVOlib_video_frame_v2_t& frame) {
+    return frame.p_data != nullptr && frame.FourCC == rgba && frame.xres > 0 && frame.yres > 0 &&
+           frame.line_stride_in_bytes / 4 >= frame.xres;
+}
+
 Media<GstBuffer> PictureFitter::fit(const QIVOlib_video_frame_v2_t& frame) {
-    const bool readable = frame.p_data != nullptr && frame.FourCC == rgba && frame.xres > 0 && frame.yres > 0 &&
-                          frame.line_stride_in_bytes / 4 >= frame.xres;
-    if (!readable || !m_pool || !prepare(frame)) {
+    if (!isReadable(frame) || !m_pool || !prepare(frame)) {
         return nullptr;
     }
     GstBufferPoolAcquireParams parameters{};

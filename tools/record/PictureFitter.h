@@ -9,22 +9,30 @@ namespace qivo::record {
  *  of one size; pictures of another size stand between black bars. Thread: one. */
 class PictureFitter {
   public:
-    /** Most memory for pictures that are being encoded. */
+    /** What may be waiting for the encoder: no more than this time's worth of pictures, since it would be lost to a
+     * power cut, and no more than this memory, but always so many that the encoder has some to work on. */
+    static constexpr double mostSeconds = 0.4;
     static constexpr std::size_t mostBytes = std::size_t{96} << 20U;
     static constexpr std::size_t fewestPictures = 6;
+    static constexpr std::size_t mostPictures = 24;
 
     explicit PictureFitter(const PictureShape& shape);
     ~PictureFitter();
     PictureFitter(const PictureFitter&) = delete;
     PictureFitter& operator=(const PictureFitter&) = delete;
 
-    /** The picture in the movie's form; null if as many as may be are still being encoded, or the frame cannot be read.
+    /** Whether the frame says that it is of the one form that is asked for. */
+    [[nodiscard]] static bool isReadable(const QIVOlib_video_frame_v2_t& frame);
+    /** The picture in the movie's form; null if as many as may be are still being encoded, or the frame is not
+     * readable.
      */
     [[nodiscard]] Media<GstBuffer> fit(const QIVOlib_video_frame_v2_t& frame);
 
     [[nodiscard]] const GstVideoInfo& format() const { return m_format; }
     /** False if there is no memory for pictures of this size. */
     [[nodiscard]] bool ready() const { return m_pool != nullptr; }
+    /** How many pictures may be waiting for the encoder. */
+    [[nodiscard]] static std::size_t mostWaiting(const PictureShape& shape);
 
   private:
     /** What a conversion depends on. */

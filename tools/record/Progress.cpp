@@ -21,6 +21,7 @@ std::string timeText(Nanoseconds time) {
 std::string progressLine(const Progress& progress) {
     return "time " + timeText(progress.length) + " pictures " + std::to_string(progress.pictures) + " dropped " +
            std::to_string(progress.dropped) + " bytes " + std::to_string(progress.bytes) +
+           (progress.soundLost == Nanoseconds(0) ? "" : " sound lost " + timeText(progress.soundLost)) +
            (progress.waiting.empty() ? "" : " waiting for " + progress.waiting);
 }
 

@@ -5,6 +5,8 @@
 #include "tools/record/Surroundings.h"
 
 #include <cstdio>
+#include <cstdlib>
+#include <future>
 
 namespace {
 
@@ -17,28 +19,50 @@ int fail(const std::string& text) {
     return 1;
 }
 
+/// Whoever started the program waits for its next line, also while it does something that takes long.
+template <typename Work, typename Tell>
+void doWhileTelling(Work work, Tell tell) {
+    const std::future<void> done = std::async(std::launch::async, work);
+    do {
+        tell();
+    } while (done.wait_for(progressInterval) != std::future_status::ready);
+}
+
 /// Until somebody wants it to end, or it cannot go on.
 void watch(Surroundings& surroundings, const Recorder& recorder) {
+    bool encoderTold = false;
     do {
         surroundings.tell(progressLine(recorder.progress(steadyNow())));
+        const std::string encoder = encoderTold ? "" : recorder.encoder();
+        if (!encoder.empty()) {
+            std::fprintf(stderr, "%s: %s\n", programName, encoder.c_str());
+            encoderTold = true;
+        }
     } while (!surroundings.endWanted(progressInterval) && recorder.state(steadyNow()) == Recorder::State::running);
+}
+
+int fail(const Arguments& arguments) {
+    return fail("nothing came from \"" + arguments.source + "\": there is no movie");
 }
 
 int record(const Arguments& arguments, const MoviePlace& place, Surroundings& surroundings) {
     Recorder recorder({arguments.source}, place);
     watch(surroundings, recorder);
     const bool gone = recorder.state(steadyNow()) == Recorder::State::sourceGone;
-    recorder.finish();
-    const Progress result = recorder.progress(steadyNow());
-    surroundings.tell(progressLine(result));
+    const auto tell = [&] { surroundings.tell(progressLine(recorder.progress(steadyNow()))); };
+    doWhileTelling([&] { recorder.finish(); }, tell);
+    tell();
     if (!recorder.problem().empty()) {
         return fail(recorder.problem());
     }
-    if (result.bytes == 0) {
-        return fail("nothing came from \"" + arguments.source + "\": there is no movie");
+    if (recorder.progress(steadyNow()).bytes == 0) {
+        return fail(arguments);
     }
     if (gone) {
         std::fprintf(stderr, "%s: \"%s\" has gone: the movie is finished\n", programName, arguments.source.c_str());
+    }
+    if (!recorder.remark().empty()) {
+        std::fprintf(stderr, "%s: %s\n", programName, recorder.remark().c_str());
     }
     return 0;
 }
@@ -50,8 +74,22 @@ int prepareAndRecord(const Arguments& arguments, Surroundings& surroundings) {
     if (!problem.empty()) {
         return fail(problem);
     }
-    gst_init(nullptr, nullptr);
-    if (!QIVOlib_initialize()) {
+    Progress nothing;
+    nothing.waiting = "the source";
+    bool initialised = false;
+    doWhileTelling(
+        [&] {
+            gst_init(nullptr, nullptr);
+            initialised = QIVOlib_initialize();
+        },
+        [&] {
+            surroundings.tell(progressLine(nothing));
+            // Looking through plug-ins for the first time takes GStreamer seconds and cannot be called off.
+            if (surroundings.endWanted(Nanoseconds(0))) {
+                std::_Exit(fail(arguments));
+            }
+        });
+    if (!initialised) {
         const std::string error = qivo::loadError();
         return fail(error.empty() ? "libqivo cannot run on this machine" : error);
     }
