@@ -29,4 +29,10 @@ target_link_libraries(qivo_record PUBLIC qivo_movie qivo_interface PkgConfig::GS
 add_executable(qivo-record record/main.cpp)
 set_target_properties(qivo-record PROPERTIES OUTPUT_NAME Application.Mac.QIVO.Recording)
 target_link_libraries(qivo-record PRIVATE qivo_record qivo_loader qivo_options)
+# Where ./run has put a link to the built program, installing would find that it leads to the same and leave it.
+install(CODE "
+    set(place \"\$ENV{DESTDIR}\${CMAKE_INSTALL_PREFIX}/${CMAKE_INSTALL_BINDIR}/Application.Mac.QIVO.Recording\")
+    if(IS_SYMLINK \"\${place}\")
+        file(REMOVE \"\${place}\")
+    endif()")
 install(TARGETS qivo-record RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
