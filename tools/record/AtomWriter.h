@@ -1,6 +1,8 @@
 #pragma once
 
+#include <array>
 #include <bit>
+#include <cstddef>
 #include <cstdint>
 #include <string_view>
 #include <vector>
@@ -51,10 +53,13 @@ class AtomWriter {
     [[nodiscard]] const std::vector<std::uint8_t>& data() const { return m_bytes; }
 
   private:
-    void number(std::uint64_t value, int count) {
-        for (int i = count - 1; i >= 0; --i) {
-            m_bytes.push_back(static_cast<std::uint8_t>(value >> (8 * i)));
+    void number(std::uint64_t value, std::size_t count) {
+        // At once: an index has millions of them.
+        std::array<std::uint8_t, sizeof(value)> bytes{};
+        for (std::size_t i = 0; i < count; ++i) {
+            bytes[i] = static_cast<std::uint8_t>(value >> (8 * (count - 1 - i)));
         }
+        m_bytes.insert(m_bytes.end(), bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(count));
     }
 
     std::vector<std::uint8_t> m_bytes;
