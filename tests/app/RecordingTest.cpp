@@ -67,6 +67,10 @@ TEST_F(RecordingTest, RecorderHasItsFixedPath) {
     EXPECT_STREQ(AppData::kRecorderPath, "/usr/local/bin/Application.Mac.QIVO.Recording");
 }
 
+TEST_F(RecordingTest, LooksEveryFiveMillisecondsWhetherTheRecorderHasEnded) {
+    EXPECT_EQ(AppData::kRecordingPollMs, 5);
+}
+
 TEST_F(RecordingTest, RecorderIsStartedWithTheSixArgumentsInOrder) {
     use("chatty");
     record();

@@ -7,6 +7,7 @@
 #include <csignal>
 #include <gmock/gmock.h>
 #include <sys/mount.h>
+#include <utility>
 
 namespace qivo::test {
 namespace {
@@ -17,6 +18,7 @@ using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::IsEmpty;
 using testing::SizeIs;
+using testing::UnorderedElementsAre;
 
 class RecordingTest : public RecordingViewerTest {};
 
@@ -32,6 +34,24 @@ TEST_F(RecordingTest, SwitchClickedOnAndOffLeavesAMovieOfWhatWasShown) {
     EXPECT_TRUE(isFinished(movie()));
     expectWholeRecording(movie(), 1.9);
     EXPECT_TRUE(picturesArrive(now()));
+}
+
+TEST_F(RecordingTest, NamesWithSlashesAndOfTheGreatestLengthAreRecordedAsTheyStand) {
+    const std::string longest(54, 'x');
+    const auto publisher = publishAndShow("STUDIO", {"a/b", longest}, {"--no-audio"});
+    for (const auto& [place, source] :
+         {std::pair(0, std::string("STUDIO (a/b)")), std::pair(1, "STUDIO (" + longest + ")")}) {
+        choose(0, place, source);
+        ASSERT_TRUE(picturesArrive(now()));
+        clickRecordSwitch();
+        EXPECT_TRUE(eventually([&] { return std::filesystem::exists(movie()); })) << m_viewer->errors();
+        recordFor(milliseconds(700));
+        clickRecordSwitch();
+        EXPECT_TRUE(isFinished(movie())) << source;
+        expectWholeRecording(movie(), 0.6, false);
+    }
+    EXPECT_EQ(m_title.size(), 63U);
+    EXPECT_THAT(recorded(), UnorderedElementsAre("STUDIO (a", m_title + ".mov")) << "a slash leads through a folder";
 }
 
 TEST_F(RecordingTest, ChoosingAnotherSourceFinishesTheMovieAndClosingTheWindowTheNext) {
