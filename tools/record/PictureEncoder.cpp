@@ -92,8 +92,9 @@ std::uint64_t PictureEncoder::finish(Nanoseconds limit) {
     if (ended && GST_MESSAGE_TYPE(ended.get()) == GST_MESSAGE_ERROR) {
         noteFailure(ended.get());
     }
+    const std::lock_guard guard(m_handing);
     m_ended = true;
-    return m_taken - std::min<std::uint64_t>(m_taken, m_handedOn);
+    return m_taken - std::min(m_taken, m_handedOn);
 }
 
 void PictureEncoder::noteFailure(GstMessage* message) const {
@@ -125,6 +126,7 @@ void PictureEncoder::handOnFormat(GstSample* sample) {
 }
 
 void PictureEncoder::handOn(GstSample* sample) {
+    const std::lock_guard guard(m_handing);
     if (m_ended) {
         return;
     }

@@ -7,7 +7,6 @@
 
 #include <gst/app/app.h>
 
-#include <atomic>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -65,10 +64,11 @@ class PictureEncoder {
     bool m_formatKnown = false; // appsink's thread only
     bool m_running = false;
     std::uint64_t m_taken = 0;
-    std::atomic<std::uint64_t> m_handedOn = 0;
-    std::atomic<bool> m_ended = false; // nothing is handed on any more
-    mutable std::mutex m_mutex;        // protects the next
-    mutable std::string m_problem;     // the bus tells it once
+    std::mutex m_handing; // held while a picture is handed on; protects the next two
+    std::uint64_t m_handedOn = 0;
+    bool m_ended = false;          // nothing is handed on any more
+    mutable std::mutex m_mutex;    // protects the next
+    mutable std::string m_problem; // the bus tells it once
     Media<GstElement> m_pipeline;
     Media<GstElement> m_in;
     Media<GstElement> m_out;

@@ -33,10 +33,10 @@ std::int64_t SampleTables::pictureEnd() const {
 
 bool SampleTables::fitsIndex() const {
     // Readers take the number for a signed one.
-    const auto last = std::numeric_limits<std::int32_t>::max();
+    constexpr std::uint32_t last = std::numeric_limits<std::int32_t>::max();
     return soundFrames <= std::numeric_limits<std::uint32_t>::max() &&
            std::all_of(pictures.begin(), pictures.end(),
-                       [last](const Picture& picture) { return picture.duration < last; });
+                       [](const Picture& picture) { return picture.duration < last; });
 }
 
 } // namespace qivo::record
