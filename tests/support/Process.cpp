@@ -4,6 +4,7 @@
 
 #include <array>
 #include <csignal>
+#include <cstdio>
 #include <cstdlib>
 #include <fcntl.h>
 #include <poll.h>
@@ -93,6 +94,14 @@ Process::~Process() {
         wait(std::chrono::seconds(10));
     }
     m_reader.join();
+    passReportOn();
+}
+
+/// What a sanitizer found in the program belongs to the test's output, whatever the test makes of the program's end.
+void Process::passReportOn() const {
+    if (m_errors.find("Sanitizer:") != std::string::npos || m_errors.find(": runtime error: ") != std::string::npos) {
+        std::fputs(m_errors.c_str(), stderr);
+    }
 }
 
 void Process::collect(int outputPipe, int errorPipe) {

@@ -39,6 +39,7 @@ class Process {
   private:
     Process(pid_t pid, int outputPipe, int errorPipe);
     void collect(int outputPipe, int errorPipe);
+    void passReportOn() const;
 
     pid_t m_pid;
     std::optional<int> m_status;
