@@ -85,13 +85,22 @@ announce_build() {
     done
 }
 
-# build PRESET [TARGET...]: configures where that has not been done and builds what has changed.
+# set_option PRESET NAME ON|OFF: changes an option of a build that has been configured with another value.
+set_option() {
+    local cache=build/$1/CMakeCache.txt
+    [ ! -e "$cache" ] || grep -q "^$2:BOOL=$3\$" "$cache" || cmake --preset "$1" "-D$2=$3" >/dev/null
+}
+
+# build PRESET [TARGET...]: configures where that has not been done and builds what has changed. With QIVO_WERROR=ON in
+# the environment warnings are errors; without it a build stays what it was.
 build() {
-    local preset=$1 targets=() log=build/$1.log
+    local preset=$1 targets=() log=build/$1.log werror=${QIVO_WERROR:-}
     shift
     [ $# -eq 0 ] || targets=(--target "$@")
     mkdir -p build
-    if [ ! -e "build/$preset/build.ninja" ] && ! cmake --preset "$preset" ${configure_options:-} >"$log" 2>&1; then
+    [ -z "$werror" ] || set_option "$preset" QIVO_WERROR "$werror"
+    if [ ! -e "build/$preset/build.ninja" ] &&
+        ! cmake --preset "$preset" ${configure_options:-} ${werror:+"-DQIVO_WERROR=$werror"} >"$log" 2>&1; then
         cat "$log" >&2
         echo "Configuring '$preset' failed." >&2
         exit 1
