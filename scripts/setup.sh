@@ -19,7 +19,7 @@ packages_to_run=(
 # A virtual screen with a window manager, and namespaces, for machines without a display and for tests.
 packages_for_screen=(xvfb openbox x11-utils util-linux mount iproute2)
 # The suppressions of leaks name functions, which only llvm's symbolizer can tell.
-packages_to_test=(clang libclang-rt-14-dev llvm libegl1 libgl1 x11-xserver-utils dbus-daemon binutils pulseaudio
+packages_to_test=(clang libclang-rt-dev llvm libegl1 libgl1 x11-xserver-utils dbus-daemon binutils pulseaudio
     pulseaudio-utils)
 packages_of_peers=(avahi-daemon avahi-utils dbus ffmpeg mpv picom chromium chromium-driver onvif-tools
     libonvif-dev)
