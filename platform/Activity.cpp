@@ -1,28 +1,33 @@
 #include "platform/Activity.h"
 
-#include <QDBusConnection>
-#include <QDBusMessage>
-#include <QDBusObjectPath>
-#include <QDBusUnixFileDescriptor>
-#include <QVariantMap>
+#include "platform/FileDescriptor.h"
+#include "platform/Log.h"
 
-#include <atomic>
+#include <algorithm>
+#include <array>
+#include <cerrno>
 #include <chrono>
-#include <condition_variable>
+#include <cstdint>
+#include <fcntl.h>
 #include <functional>
-#include <mutex>
 #include <optional>
+#include <poll.h>
+#include <string>
+#include <sys/eventfd.h>
+#include <systemd/sd-bus.h>
 #include <thread>
-#include <utility>
-#include <vector>
+#include <unistd.h>
 
 namespace qivo {
 namespace {
 
-constexpr const char* kWho = "QIVO Viewer";
-constexpr uint kPortalSuspendAndIdle = 4U | 8U;
+using std::chrono::duration_cast;
+using std::chrono::microseconds;
+using std::chrono::milliseconds;
+using Clock = std::chrono::steady_clock;
 
-using Release = std::function<void()>;
+constexpr const char* kWho = "QIVO Viewer";
+constexpr std::uint32_t kPortalSuspendAndIdle = 4U | 8U;
 
 struct Method {
     const char* service;
@@ -31,128 +36,197 @@ struct Method {
     const char* name;
 };
 
-QDBusMessage call(const QDBusConnection& bus, const Method& method, const QVariantList& arguments) {
-    auto message =
-        QDBusMessage::createMethodCall(QString::fromLatin1(method.service), QString::fromLatin1(method.path),
-                                       QString::fromLatin1(method.interface), QString::fromLatin1(method.name));
-    message.setArguments(arguments);
-    return bus.call(message, QDBus::Block, Activity::kCallTimeoutMs);
-}
+constexpr const char* kPortalService = "org.freedesktop.portal.Desktop";
+constexpr Method kPortalInhibit{kPortalService, "/org/freedesktop/portal/desktop", "org.freedesktop.portal.Inhibit",
+                                "Inhibit"};
+constexpr Method kSaverInhibit{"org.freedesktop.ScreenSaver", "/org/freedesktop/ScreenSaver",
+                               "org.freedesktop.ScreenSaver", "Inhibit"};
+constexpr Method kSaverUnInhibit{kSaverInhibit.service, kSaverInhibit.path, kSaverInhibit.interface, "UnInhibit"};
+constexpr Method kLoginInhibit{"org.freedesktop.login1", "/org/freedesktop/login1", "org.freedesktop.login1.Manager",
+                               "Inhibit"};
 
-/// The reply's only argument as a T; nothing if the call failed or answered something else.
-template <typename T>
-std::optional<T> answer(const QDBusMessage& reply) {
-    if (reply.type() != QDBusMessage::ReplyMessage || reply.arguments().size() != 1 ||
-        !reply.arguments().at(0).canConvert<T>()) {
-        return std::nullopt;
-    }
-    return reply.arguments().at(0).value<T>();
-}
-
-Release askPortal(const QDBusConnection& session, const QString& reason) {
-    static constexpr const char* kService = "org.freedesktop.portal.Desktop";
-    const auto request = answer<QDBusObjectPath>(
-        call(session, {kService, "/org/freedesktop/portal/desktop", "org.freedesktop.portal.Inhibit", "Inhibit"},
-             {QString(), kPortalSuspendAndIdle, QVariantMap{{QStringLiteral("reason"), reason}}}));
-    if (!request) {
-        return {};
-    }
-    return [session, path = request->path().toLatin1()] {
-        call(session, {kService, path.constData(), "org.freedesktop.portal.Request", "Close"}, {});
-    };
-}
-
-Release askScreenSaver(const QDBusConnection& session, const QString& reason) {
-    static constexpr Method kInhibit{"org.freedesktop.ScreenSaver", "/org/freedesktop/ScreenSaver",
-                                     "org.freedesktop.ScreenSaver", "Inhibit"};
-    const auto cookie = answer<uint>(call(session, kInhibit, {QString::fromLatin1(kWho), reason}));
-    if (!cookie) {
-        return {};
-    }
-    return [session, cookie = *cookie] {
-        call(session, {kInhibit.service, kInhibit.path, kInhibit.interface, "UnInhibit"}, {cookie});
-    };
-}
-
-/// The login manager's inhibitor is a descriptor: it holds until the last copy is closed.
-Release askLoginManager(const QDBusConnection& system, const QString& reason) {
-    const auto lock = answer<QDBusUnixFileDescriptor>(
-        call(system, {"org.freedesktop.login1", "/org/freedesktop/login1", "org.freedesktop.login1.Manager", "Inhibit"},
-             {QStringLiteral("idle:sleep"), QString::fromLatin1(kWho), reason, QStringLiteral("block")}));
-    if (!lock || !lock->isValid()) {
-        return {};
-    }
-    return [held = *lock]() mutable { held = QDBusUnixFileDescriptor(); };
-}
+struct BusCloser {
+    void operator()(sd_bus* bus) const { sd_bus_close_unref(bus); }
+};
 
 /// A connection of its own, so that an activity never shares fate or filters with another part of the application.
-QDBusConnection connectTo(QDBusConnection::BusType bus) {
-    static std::atomic<int> count = 0;
-    return QDBusConnection::connectToBus(bus, QStringLiteral("qivo-activity-%1").arg(++count));
+using Bus = std::unique_ptr<sd_bus, BusCloser>;
+
+/// Begins to connect; null where there is no such bus.
+Bus connectTo(int (*open)(sd_bus**)) {
+    sd_bus* bus = nullptr;
+    if (open(&bus) < 0) {
+        return nullptr;
+    }
+    sd_bus_set_method_call_timeout(bus, microseconds(milliseconds(Activity::kCallTimeoutMs)).count());
+    return Bus(bus);
+}
+
+/// When the connection wants to be looked at although nothing has come.
+Clock::time_point timeoutOf(sd_bus* bus) {
+    std::uint64_t us = UINT64_MAX; // of the monotonic clock, which is also the steady one
+    if (sd_bus_get_timeout(bus, &us) < 0 || us > static_cast<std::uint64_t>(INT64_MAX / 1000)) {
+        return Clock::time_point::max();
+    }
+    return Clock::time_point(microseconds(us));
+}
+
+/// Handles what has come, and closes a connection that has ended.
+void process(Bus& bus) {
+    int handled = 1;
+    while (bus && handled > 0) {
+        handled = sd_bus_process(bus.get(), nullptr);
+    }
+    if (handled < 0) {
+        bus.reset();
+    }
+}
+
+/// In whole milliseconds, rounded up; -1 for ever.
+int remaining(Clock::time_point until) {
+    if (until == Clock::time_point::max()) {
+        return -1;
+    }
+    const auto left = std::chrono::ceil<milliseconds>(until - Clock::now()).count();
+    return static_cast<int>(std::clamp<std::int64_t>(left, 0, INT32_MAX));
 }
 
 } // namespace
 
-struct Activity::State {
-    std::mutex mutex; // protects the flags
-    std::condition_variable changed;
-    bool ending = false;
-    bool ended = false;
-
-    bool isEnding() {
-        const std::lock_guard guard(mutex);
-        return ending;
+/// What is said to the services, on the thread that says it. No call waits: requests are sent, answers come to
+/// functions, and the thread sleeps until one of the connections or the activity's end wakes it.
+class Activity::Conversation {
+  public:
+    explicit Conversation(const QString& reason) : m_reason(reason.toStdString()), m_end(eventfd(0, EFD_CLOEXEC)) {
+        if (!m_end) {
+            logLine("The system is not kept from going to sleep: no event (error %d)", errno);
+            return;
+        }
+        m_thread = std::thread([this] { run(); });
     }
 
-    void run(const QString& reason) {
-        QDBusConnection session = connectTo(QDBusConnection::SessionBus);
-        QDBusConnection system = connectTo(QDBusConnection::SystemBus);
-        std::vector<Release> releases;
-        const auto keep = [&](Release release) {
-            const bool granted = static_cast<bool>(release);
-            if (granted) {
-                releases.push_back(std::move(release));
+    ~Conversation() {
+        if (m_thread.joinable()) {
+            eventfd_write(m_end.number(), 1);
+            m_thread.join();
+        }
+    }
+
+    Conversation(const Conversation&) = delete;
+    Conversation& operator=(const Conversation&) = delete;
+
+  private:
+    void run() {
+        m_session = connectTo(sd_bus_open_user);
+        m_system = connectTo(sd_bus_open_system);
+        askPortal();
+        askLoginManager();
+        serveUntil([this] { return m_ending; }, Clock::time_point::max());
+        release();
+        serveUntil([this] { return m_releasing == 0; }, Clock::now() + milliseconds(kEndTimeoutMs));
+        m_session.reset();
+        m_system.reset();
+    }
+
+    void serveUntil(const std::function<bool()>& done, Clock::time_point deadline) {
+        while (!done() && Clock::now() < deadline) {
+            Clock::time_point until = deadline;
+            std::array<pollfd, 3> waited{{{m_ending ? -1 : m_end.number(), POLLIN, 0}, {-1, 0, 0}, {-1, 0, 0}}};
+            pollfd* place = &waited[1];
+            for (const Bus* bus : {&m_session, &m_system}) {
+                if (*bus) {
+                    *place++ = {sd_bus_get_fd(bus->get()), static_cast<short>(sd_bus_get_events(bus->get())), 0};
+                    until = std::min(until, timeoutOf(bus->get()));
+                }
             }
-            return granted;
-        };
-        if (session.isConnected() && !keep(askPortal(session, reason)) && !isEnding()) {
-            keep(askScreenSaver(session, reason));
+            poll(waited.data(), waited.size(), remaining(until));
+            m_ending = m_ending || waited[0].revents != 0;
+            process(m_session);
+            process(m_system);
         }
-        if (system.isConnected() && !isEnding()) {
-            keep(askLoginManager(system, reason));
-        }
-        waitForEnd();
-        for (Release& release : releases) {
-            release();
-        }
-        QDBusConnection::disconnectFromBus(session.name());
-        QDBusConnection::disconnectFromBus(system.name());
     }
 
-    void waitForEnd() {
-        std::unique_lock lock(mutex);
-        changed.wait(lock, [this] { return ending; });
+    /// Sends a request; `answered` gets the answer, or the error in its place. Nothing where it cannot be sent.
+    template <typename... Arguments>
+    bool ask(const Bus& bus, const Method& method, sd_bus_message_handler_t answered, const char* types,
+             Arguments... arguments) {
+        return bus && sd_bus_call_method_async(bus.get(), nullptr, method.service, method.path, method.interface,
+                                               method.name, answered, this, types, arguments...) >= 0;
     }
 
-    void noteEnded() {
-        const std::lock_guard guard(mutex);
-        ended = true;
-        changed.notify_all();
+    void askPortal() {
+        ask(m_session, kPortalInhibit, portalAnswered, "sua{sv}", "", kPortalSuspendAndIdle, 1, "reason", "s",
+            m_reason.c_str());
     }
+
+    static int portalAnswered(sd_bus_message* answer, void* self, sd_bus_error*) {
+        auto& my = *static_cast<Conversation*>(self);
+        const char* request = nullptr;
+        if (sd_bus_message_is_method_error(answer, nullptr) == 0 && sd_bus_message_read(answer, "o", &request) > 0) {
+            my.m_portalRequest = request;
+        } else if (!my.m_ending) {
+            my.askScreenSaver();
+        }
+        return 0;
+    }
+
+    void askScreenSaver() { ask(m_session, kSaverInhibit, saverAnswered, "ss", kWho, m_reason.c_str()); }
+
+    static int saverAnswered(sd_bus_message* answer, void* self, sd_bus_error*) {
+        std::uint32_t cookie = 0;
+        if (sd_bus_message_is_method_error(answer, nullptr) == 0 && sd_bus_message_read(answer, "u", &cookie) > 0) {
+            static_cast<Conversation*>(self)->m_saverCookie = cookie;
+        }
+        return 0;
+    }
+
+    void askLoginManager() {
+        ask(m_system, kLoginInhibit, loginAnswered, "ssss", "idle:sleep", kWho, m_reason.c_str(), "block");
+    }
+
+    /// The login manager's inhibitor is a descriptor: it holds until the last copy is closed.
+    static int loginAnswered(sd_bus_message* answer, void* self, sd_bus_error*) {
+        int lock = -1; // the message's
+        if (sd_bus_message_is_method_error(answer, nullptr) == 0 && sd_bus_message_read(answer, "h", &lock) > 0) {
+            static_cast<Conversation*>(self)->m_loginLock = FileDescriptor(fcntl(lock, F_DUPFD_CLOEXEC, 0));
+        }
+        return 0;
+    }
+
+    /// What was asked and has not been answered ends with its connection, by which the services know who asked.
+    void release() {
+        if (!m_portalRequest.empty()) {
+            const Method close{kPortalService, m_portalRequest.c_str(), "org.freedesktop.portal.Request", "Close"};
+            m_releasing += static_cast<int>(ask(m_session, close, released, ""));
+        }
+        if (m_saverCookie) {
+            m_releasing += static_cast<int>(ask(m_session, kSaverUnInhibit, released, "u", *m_saverCookie));
+        }
+        m_loginLock.reset();
+    }
+
+    static int released(sd_bus_message*, void* self, sd_bus_error*) {
+        --static_cast<Conversation*>(self)->m_releasing;
+        return 0;
+    }
+
+    const std::string m_reason;
+    const FileDescriptor m_end; // becomes readable once the activity ends
+
+    // The thread's.
+    Bus m_session;
+    Bus m_system;
+    std::string m_portalRequest;
+    std::optional<std::uint32_t> m_saverCookie;
+    FileDescriptor m_loginLock;
+    bool m_ending = false;
+    int m_releasing = 0; // releases that have not been answered
+
+    std::thread m_thread; // last, as it uses the others
 };
 
-Activity::Activity(const QString& reason) : m_state(std::make_shared<State>()) {
-    std::thread([state = m_state, reason] {
-        state->run(reason);
-        state->noteEnded();
-    }).detach();
-}
+Activity::Activity(const QString& reason) : m_conversation(std::make_unique<Conversation>(reason)) {}
 
-Activity::~Activity() {
-    std::unique_lock lock(m_state->mutex);
-    m_state->ending = true;
-    m_state->changed.notify_all();
-    m_state->changed.wait_for(lock, std::chrono::milliseconds(kEndTimeoutMs), [this] { return m_state->ended; });
-}
+Activity::~Activity() = default;
 
 } // namespace qivo

@@ -11,11 +11,13 @@ namespace qivo {
 /// absent or refuses is passed over in silence.
 ///
 /// Beginning never waits: the services are asked on a thread of the activity's own. Ending waits until they were told,
-/// at most kEndTimeoutMs.
+/// at most kEndTimeoutMs, and for the thread, which holds nothing that could block; so nothing of an activity is left
+/// when the process ends, however a bus behaves.
 ///
 /// Thread: any.
 class Activity {
   public:
+    /// A service that has not answered by then counts as absent.
     static constexpr int kCallTimeoutMs = 5000;
     static constexpr int kEndTimeoutMs = 500;
 
@@ -26,8 +28,8 @@ class Activity {
     Activity& operator=(const Activity&) = delete;
 
   private:
-    struct State;
-    std::shared_ptr<State> m_state; // shared with the thread, which may outlive a bus that does not answer
+    class Conversation;
+    std::unique_ptr<Conversation> m_conversation;
 };
 
 } // namespace qivo

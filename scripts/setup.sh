@@ -6,7 +6,7 @@ packages_to_build=(
     g++ cmake ninja-build pkg-config
     qt6-base-dev libgl-dev libegl-dev libepoxy-dev
     libgstreamer1.0-dev libgstreamer-plugins-base1.0-dev libgstrtspserver-1.0-dev
-    libavahi-core-dev libglib2.0-dev libpango1.0-dev libsoup-3.0-dev libpulse-dev libsdl2-dev libxml2-dev
+    libavahi-core-dev libglib2.0-dev libpango1.0-dev libsoup-3.0-dev libpulse-dev libsdl2-dev libsystemd-dev libxml2-dev
     libgtest-dev libgmock-dev libbenchmark-dev libx11-dev libxtst-dev libxcb1-dev
     libpng-dev libtiff-dev libjpeg-dev
 )

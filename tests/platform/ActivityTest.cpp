@@ -11,6 +11,9 @@
 #include <QVariantMap>
 
 #include <array>
+#include <atomic>
+#include <chrono>
+#include <cstdlib>
 #include <fcntl.h>
 #include <functional>
 #include <gmock/gmock.h>
@@ -25,6 +28,7 @@ namespace {
 
 using testing::ElementsAre;
 using testing::IsEmpty;
+using testing::UnorderedElementsAre;
 
 /// Stands for whatever services a desktop has, and notes what they are asked.
 class Portal : public QObject {
@@ -150,8 +154,12 @@ class ActivityTest : public testing::Test {
 
     void end(std::unique_ptr<Activity>& activity) {
         // The services answer on this thread, which therefore must not be the one that waits.
-        std::thread ending([&] { activity.reset(); });
-        runUntil([&] { return !activity; });
+        std::atomic<bool> ended = false;
+        std::thread ending([&] {
+            activity.reset();
+            ended = true;
+        });
+        runUntil([&] { return ended.load(); });
         ending.join();
         QCoreApplication::processEvents();
     }
@@ -176,8 +184,8 @@ TEST_F(ActivityTest, AsksThePortalAndReleasesItAtItsEnd) {
 
     auto activity = std::make_unique<Activity>("realtime UDP receiving");
     EXPECT_TRUE(runUntil([&] { return calls.size() >= 2; }));
-    EXPECT_THAT(calls, ElementsAre("portal inhibit '' 12 realtime UDP receiving",
-                                   "login inhibit idle:sleep QIVO Viewer: realtime UDP receiving block"));
+    EXPECT_THAT(calls, UnorderedElementsAre("portal inhibit '' 12 realtime UDP receiving",
+                                            "login inhibit idle:sleep QIVO Viewer: realtime UDP receiving block"));
     EXPECT_FALSE(login.isReleased());
     end(activity);
     EXPECT_TRUE(runUntil([&] { return calls.size() >= 3 && login.isReleased(); }));
@@ -203,23 +211,60 @@ TEST(Activity, IsSilentWhereThereIsNoBus) {
     EXPECT_THAT(testing::internal::GetCapturedStderr(), IsEmpty());
 }
 
-TEST(Activity, NeitherBeginningNorEndingWaitsForABusThatDoesNotAnswer) {
+/// Two buses that take connections and never say a word.
+class SilentBusTest : public testing::Test {
+  protected:
+    void SetUp() override {
+        sockaddr_un address{};
+        address.sun_family = AF_UNIX;
+        path.copy(address.sun_path, sizeof(address.sun_path) - 1);
+        ASSERT_EQ(bind(silent, reinterpret_cast<const sockaddr*>(&address), sizeof(address)), 0);
+        ASSERT_EQ(listen(silent, 2), 0);
+        qputenv("DBUS_SESSION_BUS_ADDRESS", ("unix:path=" + path).c_str());
+        qputenv("DBUS_SYSTEM_BUS_ADDRESS", ("unix:path=" + path).c_str());
+    }
+
+    void TearDown() override {
+        close(silent);
+        unlink(path.c_str());
+    }
+
     const std::string path = testing::TempDir() + "qivo-silent-bus-" + std::to_string(getpid());
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    path.copy(address.sun_path, sizeof(address.sun_path) - 1);
     const int silent = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
-    ASSERT_EQ(bind(silent, reinterpret_cast<const sockaddr*>(&address), sizeof(address)), 0);
-    ASSERT_EQ(listen(silent, 1), 0);
-    qputenv("DBUS_SESSION_BUS_ADDRESS", ("unix:path=" + path).c_str());
+};
+
+TEST_F(SilentBusTest, KeepsNeitherTheBeginningNorTheEndWaiting) {
     const auto start = std::chrono::steady_clock::now();
     {
         const Activity activity("realtime UDP receiving");
         EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(200));
     }
     EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(2 * Activity::kEndTimeoutMs));
-    close(silent); // hangs up, so that the thread ends before the process does
-    unlink(path.c_str());
+}
+
+TEST_F(SilentBusTest, KeepsNoProcessFromEnding) {
+    const auto runAndExit = [] {
+        {
+            const Activity activity("realtime UDP receiving");
+            std::this_thread::sleep_for(std::chrono::milliseconds(100)); // so that it is in the middle of asking
+        }
+        std::exit(7); // NOLINT(concurrency-mt-unsafe): destroys what is static, as the end of main does
+    };
+    const auto start = std::chrono::steady_clock::now();
+    EXPECT_EXIT(runAndExit(), testing::ExitedWithCode(7), "^$");
+    EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(3));
+}
+
+/// A bus that works, with services that take requests and never answer.
+TEST_F(ActivityTest, ServiceThatDoesNotAnswerKeepsNobodyWaiting) {
+    ASSERT_TRUE(bus().registerService("org.freedesktop.portal.Desktop"));
+    ASSERT_TRUE(bus().registerService("org.freedesktop.login1"));
+    const auto start = std::chrono::steady_clock::now();
+    {
+        const Activity activity("realtime UDP receiving");
+        std::this_thread::sleep_for(std::chrono::milliseconds(100)); // nothing is served meanwhile
+    }
+    EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(100 + 2 * Activity::kEndTimeoutMs));
 }
 
 } // namespace
