@@ -90,6 +90,12 @@ void* openShared(const std::string& name, std::string& error) {
     return handle;
 }
 
+/// Whether the linker's message is about the library's bare name, which it goes by until it has been found somewhere.
+/// The words of the message depend on the user's language.
+bool wasNotFound(const std::string& error) {
+    return error.rfind(std::string(kLibraryName) + ":", 0) == 0;
+}
+
 bool openLibrary(Library& lib) {
     const std::lock_guard guard(lib.mutex);
     if (lib.open) {
@@ -98,7 +104,7 @@ bool openLibrary(Library& lib) {
     lib.error.clear();
     std::string name = kLibraryName;
     void* handle = openShared(name, lib.error);
-    if (handle == nullptr) {
+    if (handle == nullptr && wasNotFound(lib.error)) {
         name = programFolder() + "/../lib/" + kLibraryName;
         handle = openShared(name, lib.error);
     }
@@ -111,11 +117,20 @@ bool openLibrary(Library& lib) {
         dlclose(handle);
         return false;
     }
-    lib.error.clear();
     lib.path = name;
     lib.operations = operations;
     lib.open = true;
     return true;
+}
+
+bool initialize(Library& lib) {
+    if (!openLibrary(lib)) {
+        return false;
+    }
+    const bool runs = lib.operations.initialize();
+    const std::lock_guard guard(lib.mutex);
+    lib.error = runs ? "" : lib.path + " refused to start";
+    return runs;
 }
 
 /// The table once a library is open, else null.
@@ -143,7 +158,7 @@ using qivo::operations;
 extern "C" {
 
 bool QIVOlib_initialize(void) {
-    return qivo::openLibrary(qivo::library()) && operations()->initialize();
+    return qivo::initialize(qivo::library());
 }
 
 void QIVOlib_destroy(void) {

@@ -138,6 +138,16 @@ TEST_F(ProgramTest, LibqivoThatLacksAnOperationIsNamed) {
     EXPECT_EQ(program->wait(kSoon), 0);
 }
 
+TEST_F(ProgramTest, LibqivoThatRefusesToStartIsNamed) {
+    const auto program = start({std::string("LD_LIBRARY_PATH=") + STAND_INS + "/refusing"});
+    ASSERT_TRUE(waitForWindow());
+    EXPECT_TRUE(program->waitForOutput("Cannot run QIVO."));
+    EXPECT_TRUE(eventually([&] { return program->errors().find('\n') != std::string::npos; }));
+    EXPECT_THAT(program->errors(), HasSubstr("libqivo cannot be used: libqivo.so refused to start\n"));
+    program->signal(SIGTERM);
+    EXPECT_EQ(program->wait(kSoon), 0);
+}
+
 TEST_F(ProgramTest, WithoutDisplayItEndsWithOneLine) {
     for (const auto& [variable, said] : std::vector<std::pair<std::string, std::string>>{
              {"DISPLAY=", "neither DISPLAY nor WAYLAND_DISPLAY is set"},

@@ -2,8 +2,10 @@
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <iterator>
 #include <memory>
 #include <string>
 
@@ -30,8 +32,23 @@ class LoaderTest : public testing::Test {
         std::filesystem::copy(std::filesystem::path(STAND_INS) / kind / "libqivo.so", m_folder / "lib" / "libqivo.so");
     }
 
+    /// Puts a file into a folder of its own, for the dynamic linker to find.
+    std::string install(const std::string& content) const {
+        std::filesystem::create_directories(m_folder / "installed");
+        std::ofstream(m_folder / "installed" / "libqivo.so", std::ios::binary) << content;
+        return m_folder / "installed";
+    }
+
+    static std::string contentOf(const std::string& kind) {
+        std::ifstream file(std::string(STAND_INS) + "/" + kind + "/libqivo.so", std::ios::binary);
+        return {std::istreambuf_iterator<char>(file), {}};
+    }
+
     std::string run(const std::string& installedKind = "") {
-        const std::string path = installedKind.empty() ? "/nonexistent" : std::string(STAND_INS) + "/" + installedKind;
+        return runWith(installedKind.empty() ? "/nonexistent" : std::string(STAND_INS) + "/" + installedKind);
+    }
+
+    std::string runWith(const std::string& path) {
         const std::string command = "LD_LIBRARY_PATH='" + path + "' '" + (m_folder / "bin" / "probe").string() + "'";
         const std::unique_ptr<FILE, int (*)(FILE*)> pipe(popen(command.c_str(), "r"), pclose);
         std::string output;
@@ -74,6 +91,35 @@ TEST_F(LoaderTest, ALibraryThatLacksAnOperationIsRefusedByName) {
     EXPECT_THAT(output, HasSubstr("initialize: 0\n"));
     EXPECT_THAT(output, HasSubstr("error: libqivo.so lacks the operation QIVOlib_recv_ptz_recall_preset\n"));
     EXPECT_THAT(output, Not(HasSubstr("stand-in: initialize")));
+}
+
+TEST_F(LoaderTest, AnInstalledLibraryThatCannotBeLoadedIsNotPassedOver) {
+    ship("complete");
+    for (const std::string& damaged : {std::string(), contentOf("complete").substr(0, 100)}) {
+        const std::string folder = install(damaged);
+        const std::string output = runWith(folder);
+        EXPECT_THAT(output, HasSubstr("initialize: 0\nerror: " + folder + "/libqivo.so: "));
+        EXPECT_THAT(output, Not(HasSubstr("stand-in: initialize")));
+    }
+}
+
+TEST_F(LoaderTest, AnInstalledLibraryThatLacksOneThatItNeedsIsNotPassedOver) {
+    ship("complete");
+    std::string library = contentOf("complete");
+    const std::string needed = "libc.so.6";
+    const std::size_t name = library.find(needed);
+    ASSERT_NE(name, std::string::npos);
+    library.replace(name, needed.size(), "no-c.so.6");
+    const std::string output = runWith(install(library));
+    EXPECT_THAT(output, HasSubstr("initialize: 0\nerror: no-c.so.6: "));
+    EXPECT_THAT(output, Not(HasSubstr("stand-in: initialize")));
+}
+
+TEST_F(LoaderTest, ALibraryThatRefusesToStartIsNamed) {
+    ship("refusing");
+    const std::string output = run();
+    EXPECT_THAT(output, HasSubstr("stand-in: initialize\ninitialize: 0\nerror: " +
+                                  (m_folder / "bin/../lib/libqivo.so").string() + " refused to start\n"));
 }
 
 TEST_F(LoaderTest, ADamagedLibraryIsAnErrorAndNotACrash) {

@@ -6,7 +6,11 @@
 extern "C" {
 bool QIVOlib_initialize(void) {
     std::puts("stand-in: initialize");
+#ifdef REFUSES_TO_START
+    return false;
+#else
     return true;
+#endif
 }
 void QIVOlib_destroy(void) {
     std::puts("stand-in: destroy");
