@@ -3,8 +3,10 @@
 #include <QCoreApplication>
 #include <QTimer>
 
+#include <chrono>
 #include <csignal>
 #include <gmock/gmock.h>
+#include <thread>
 #include <vector>
 
 namespace qivo {
@@ -34,6 +36,27 @@ TEST_P(TerminationSignalsTest, ArrivesInTheEventLoopAndCanEndIt) {
 TEST_P(TerminationSignalsTest, EndsTheProcessAsUsualOnceTheObjectIsGone) {
     { const TerminationSignals signalsToEnd; }
     EXPECT_EXIT(raise(GetParam()), testing::KilledBySignal(GetParam()), "");
+}
+
+TEST_P(TerminationSignalsTest, SecondOneEndsAProcessThatDoesNotComeToAnEnd) {
+    const auto hang = [] {
+        const TerminationSignals signalsToEnd;
+        raise(SIGTERM);
+        std::this_thread::sleep_for(std::chrono::milliseconds(TerminationSignals::kPatienceMs + 10));
+        raise(GetParam());
+    };
+    EXPECT_EXIT(hang(), testing::KilledBySignal(GetParam()), "");
+}
+
+TEST_P(TerminationSignalsTest, SeveralAtOnceAreOneRequest) {
+    const TerminationSignals signalsToEnd;
+    std::vector<int> received;
+    QObject::connect(&signalsToEnd, &TerminationSignals::received, &application,
+                     [&](int signal) { received.push_back(signal); });
+    raise(GetParam());
+    raise(SIGHUP);
+    QCoreApplication::processEvents();
+    EXPECT_THAT(received, testing::ElementsAre(GetParam(), SIGHUP));
 }
 
 INSTANTIATE_TEST_SUITE_P(All, TerminationSignalsTest, testing::Values(SIGTERM, SIGINT, SIGHUP));
