@@ -2,6 +2,7 @@
 
 #include <QGuiApplication>
 
+#include <algorithm>
 #include <string_view>
 
 namespace qivo {
@@ -13,18 +14,36 @@ std::string_view viewOf(const char* text) {
     return text != nullptr ? std::string_view(text) : std::string_view();
 }
 
-/// A title as a menu shows it literally: "&" would mark a key, a tab would begin the column of shortcuts, and a title
-/// without end would make the menu wider than the screen.
+/// Whether a character is not seen but changes how others are. Some turn the direction of what follows round, so that
+/// one name could pass for another. The two that join and part letters are words' and pictures' own.
+bool isHiddenMark(char32_t character) {
+    constexpr char32_t kNonJoiner = 0x200c;
+    constexpr char32_t kJoiner = 0x200d;
+    return QChar::category(character) == QChar::Other_Format && character != kNonJoiner && character != kJoiner;
+}
+
+bool isControl(char32_t character) {
+    const QChar::Category category = QChar::category(character);
+    return category == QChar::Other_Control || category == QChar::Separator_Line ||
+           category == QChar::Separator_Paragraph;
+}
+
+/// A title as a menu shows it literally: "&" would mark a key, a tab would begin the column of shortcuts, a hidden mark
+/// would deceive, and a title without end would make the menu wider than the screen.
 QString menuText(QString title) {
     if (title.size() > QIVOFileMenu::kLongestTitle) {
         title.truncate(QIVOFileMenu::kLongestTitle);
         title.append(QChar(0x2026));
     }
-    for (QChar& character : title) {
-        if (character.category() == QChar::Other_Control) {
-            character = QLatin1Char(' ');
+    QList<uint> characters = title.toUcs4();
+    for (uint& character : characters) {
+        if (isControl(character)) {
+            character = U' ';
+        } else if (isHiddenMark(character)) {
+            character = QChar::ReplacementCharacter;
         }
     }
+    title = QString::fromUcs4(reinterpret_cast<const char32_t*>(characters.constData()), characters.size());
     return title.replace(QLatin1Char('&'), QLatin1String("&&"));
 }
 
@@ -89,10 +108,19 @@ void QIVOFileMenu::updateMenu() {
 
 /// Between press and release the entry under the pointer must stay what it is.
 void QIVOFileMenu::updatePeriodically() {
-    const bool inUse = QGuiApplication::mouseButtons() != Qt::NoButton || actions().size() > kMostLiveEntries;
-    if (!isVisible() || !inUse) {
+    if (!isVisible() || (QGuiApplication::mouseButtons() == Qt::NoButton && entriesOnScreen() <= kMostLiveEntries)) {
         updateMenu();
     }
+}
+
+/// The entries of the largest menu that is open, from this one down.
+qsizetype QIVOFileMenu::entriesOnScreen() const {
+    qsizetype largest = 0;
+    for (const QMenu* menu = this; menu != nullptr && menu->isVisible();) {
+        largest = std::max(largest, menu->actions().size());
+        menu = menu->activeAction() != nullptr ? menu->activeAction()->menu() : nullptr;
+    }
+    return largest;
 }
 
 void QIVOFileMenu::rebuild() {

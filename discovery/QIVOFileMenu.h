@@ -33,8 +33,8 @@ class QIVOFileMenu : public QMenu {
     static constexpr int kClosedIntervalMs = 1000;
     /// While open, changes are to appear while the user looks.
     static constexpr int kOpenIntervalMs = 250;
-    /// An open menu with more entries than this of its own is left as it is until it closes, because the toolkit
-    /// measures an open menu anew for every entry that comes or goes.
+    /// While this menu or an open one below it has more entries than this, the sources are left as they are, because
+    /// the toolkit measures an open menu anew for every entry that comes or goes.
     static constexpr int kMostLiveEntries = 250;
     /// Characters of a title that are shown; the rest is replaced by an ellipsis.
     static constexpr int kLongestTitle = 200;
@@ -83,6 +83,7 @@ class QIVOFileMenu : public QMenu {
 
     void initialize();
     void updatePeriodically();
+    qsizetype entriesOnScreen() const;
     void rebuild();
     void removeAllItems();
     Path highlightedPath() const;

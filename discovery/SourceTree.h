@@ -21,14 +21,15 @@ class SourceTree {
     /// The only node without a title.
     static constexpr Node kRoot = 0;
 
-    /// Machines within machines beyond which the rest of a name is one leaf, so that a hostile name cannot nest menus
-    /// without end. An announced name has at most 63 bytes, which is too short to reach a third of it.
+    /// Machines within machines beyond which the rest of a name is one leaf. It is the one exception from the rule of
+    /// `addName`, which itself knows no limit, so that a hostile name cannot nest menus without end: the toolkit would
+    /// run out of stack over them. An announced name has at most 63 bytes, too short to reach a third of it.
     static constexpr int kMaximumDepth = 64;
 
     SourceTree();
 
     /// Adds a name below a node, as machine and source where it has the form *MACHINE (SOURCE)*, and the source part
-    /// in turn; else as a leaf. Text after the last ")" is dropped.
+    /// in turn, kMaximumDepth times at most; else as a leaf. Text after the last ")" is dropped.
     void addName(std::string_view name, Node toParent = kRoot);
 
     const std::string& title(Node node) const { return m_nodes[node].title; }

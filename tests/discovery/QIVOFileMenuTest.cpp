@@ -191,6 +191,44 @@ TEST_F(QIVOFileMenuTest, TitlesAreShownLiterally) {
     EXPECT_EQ(QIVOFileMenu::titleOf(source), "A && B\tC\nD");
 }
 
+TEST_F(QIVOFileMenuTest, HiddenMarksThatWouldDisguiseATitleAreShown) {
+    QIVOFileMenu menu;
+    const QString turned = QStringLiteral("CAM\u202e1\u2066\u200b\u2028") + QString::fromUcs4(U"\U000e0041");
+    after(menu, {turned.toStdString()});
+    const QAction* source = menu.actions().at(0);
+    EXPECT_EQ(source->text(), QStringLiteral("CAM\ufffd1\ufffd\ufffd \ufffd"));
+    EXPECT_EQ(QIVOFileMenu::titleOf(source), turned);
+    QString name;
+    QString url;
+    ASSERT_TRUE(menu.getQIVOFinderInfoAt(0, name, url));
+    EXPECT_EQ(name, turned) << "the library knows it by its own name";
+}
+
+TEST_F(QIVOFileMenuTest, MarksThatWordsAndPicturesNeedAreLeft) {
+    QIVOFileMenu menu;
+    const QString title =
+        QStringLiteral("\u0645\u06cc\u200c\u062e ") + QString::fromUcs4(U"\U0001F468\u200d\U0001F4BB");
+    after(menu, {title.toStdString()});
+    EXPECT_EQ(menu.actions().at(0)->text(), title);
+}
+
+TEST_F(QIVOFileMenuTest, NameAndAddressThatTheLibraryLeavesOutAreEmpty) {
+    QIVOFileMenu menu;
+    fake.setSources({{std::nullopt, std::nullopt}, {std::nullopt, "fake://1"}, {"B", std::nullopt}});
+    menu.updateMenu();
+    EXPECT_EQ(describe(menu), "=0, =1, B=2");
+    QString name = "before";
+    QString url = "before";
+    ASSERT_TRUE(menu.getQIVOFinderInfoAt(0, name, url));
+    EXPECT_TRUE(name.isNull() && url.isNull());
+    ASSERT_TRUE(menu.getQIVOFinderInfoAt(1, name, url));
+    EXPECT_TRUE(name.isNull());
+    EXPECT_EQ(url, "fake://1");
+    ASSERT_TRUE(menu.getQIVOFinderInfoAt(2, name, url));
+    EXPECT_EQ(name, "B");
+    EXPECT_TRUE(url.isNull());
+}
+
 TEST_F(QIVOFileMenuTest, TitleWithoutEndIsShownUpToTheLimit) {
     QIVOFileMenu menu;
     const std::string name(QIVOFileMenu::kLongestTitle + 1, 'x');
@@ -367,6 +405,40 @@ TEST_F(OpenMenuTest, ItemUnderAPressedButtonStaysWhatItIs) {
     EXPECT_EQ(describe(*menu), "A=0, B=1");
     QTest::mouseRelease(menu, Qt::LeftButton, Qt::NoModifier, second);
     EXPECT_THAT(chosen, ElementsAre("B"));
+}
+
+TEST_F(OpenMenuTest, LongSubmenuThatIsOpenStaysAsItIsUntilItCloses) {
+    std::vector<std::string> names;
+    for (int i = 0; i <= QIVOFileMenu::kMostLiveEntries; ++i) {
+        names.push_back("A (" + std::to_string(i) + ")");
+    }
+    announce(names);
+    open();
+    const QMenu* machine = menu->actions().at(0)->menu();
+    menu->setActiveAction(machine->menuAction());
+    while (!machine->isVisible()) {
+        key(Qt::Key_Right);
+    }
+    announce({"A (x)", "B (y)"});
+    QTest::qWait(3 * QIVOFileMenu::kOpenIntervalMs);
+    ASSERT_EQ(menu->actions().size(), 1);
+    EXPECT_EQ(menu->actions().at(0)->menu(), machine) << "left as it was";
+    key(Qt::Key_Left);
+    menu->setActiveAction(nullptr);
+    EXPECT_TRUE(shows("A{x=0}, B{y=1}"));
+    EXPECT_TRUE(menu->isVisible());
+}
+
+TEST_F(OpenMenuTest, LongSubmenuThatIsClosedKeepsNothingUp) {
+    std::vector<std::string> names;
+    for (int i = 0; i <= QIVOFileMenu::kMostLiveEntries; ++i) {
+        names.push_back("A (" + std::to_string(i) + ")");
+    }
+    announce(names);
+    open();
+    menu->setActiveAction(nullptr);
+    announce({"B (y)"});
+    EXPECT_TRUE(shows("B{y=0}"));
 }
 
 TEST_F(OpenMenuTest, AThousandChangesOfAnOpenMenuLeaveNothingBehind) {

@@ -327,7 +327,8 @@ const QIVOlib_source_t* QIVOlib_find_get_current_sources(QIVOlib_find_instance_t
     state.reported = state.sources;
     state.reportedRecords.clear();
     for (const auto& source : state.reported) {
-        state.reportedRecords.push_back({source.name.c_str(), source.url.c_str()});
+        state.reportedRecords.push_back(
+            {source.name ? source.name->c_str() : nullptr, source.url ? source.url->c_str() : nullptr});
     }
     *p_no_sources = static_cast<uint32_t>(state.reportedRecords.size());
     return state.reportedRecords.empty() ? nullptr : state.reportedRecords.data();

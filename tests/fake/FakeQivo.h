@@ -7,6 +7,7 @@
 #include <map>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -28,9 +29,10 @@ class FakeQivo {
         std::vector<float> samples;
     };
 
+    /// What is left out is null in the list.
     struct Source {
-        std::string name;
-        std::string url;
+        std::optional<std::string> name;
+        std::optional<std::string> url;
     };
 
     /// The fake that the C functions talk to.
