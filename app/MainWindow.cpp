@@ -60,6 +60,8 @@ bool MainWindow::eventFilter(QObject* watched, QEvent* event) {
     case QEvent::Move:
     case QEvent::Resize:
     case QEvent::MouseMove:
+    case QEvent::Enter:
+    case QEvent::Leave: // to another screen
     case QEvent::MouseButtonRelease:
     case QEvent::KeyRelease:
     case QEvent::Show:
@@ -81,10 +83,9 @@ void MainWindow::placeMenuBar() {
 }
 
 bool MainWindow::menuBarIsWanted() const {
-    const int distance = mapFromGlobal(QCursor::pos()).y();
     const int reach = menuBar()->maximumHeight() > 0 ? menuBar()->sizeHint().height() : kRevealDistance;
     return QApplication::activePopupWidget() != nullptr || menuBar()->activeAction() != nullptr ||
-           (distance >= 0 && distance < reach);
+           QRect(0, 0, width(), reach).contains(mapFromGlobal(QCursor::pos()));
 }
 
 } // namespace qivo

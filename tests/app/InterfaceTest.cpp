@@ -12,6 +12,7 @@
 
 #include <QAccessible>
 #include <QFileDialog>
+#include <QKeyEvent>
 #include <QMenuBar>
 #include <QProcess>
 #include <QScreen>
@@ -504,6 +505,7 @@ class TwoScreensTest : public UserTest {
     static void SetUpTestSuite() {
         s_screensExist = xrandr({"--setmonitor", "LEFT", "640/170x1024/270+0+0", "screen"}) &&
                          xrandr({"--setmonitor", "RIGHT", "640/170x1024/270+640+0", "none"});
+        restartWindowManager();
         qputenv("QT_SCREEN_SCALE_FACTORS", "1;2");
         UserTest::SetUpTestSuite();
     }
@@ -517,10 +519,45 @@ class TwoScreensTest : public UserTest {
 
     static bool xrandr(const QStringList& arguments) { return QProcess::execute("xrandr", arguments) == 0; }
 
+    /// It knows of the screens that it found when it began.
+    static void restartWindowManager() {
+        xprop({"-remove", "_NET_SUPPORTING_WM_CHECK"});
+        QProcess::execute("openbox", {"--restart"});
+        runUntil([] { return xprop({"_NET_SUPPORTING_WM_CHECK"}).contains("window id"); });
+    }
+
+    static QByteArray xprop(const QStringList& arguments) {
+        QProcess process;
+        process.start("xprop", QStringList{"-root"} + arguments);
+        process.waitForFinished();
+        return process.readAllStandardOutput();
+    }
+
     static bool s_screensExist;
 };
 
 bool TwoScreensTest::s_screensExist = false;
+
+TEST_F(TwoScreensTest, MenuBarOfAFullScreenGoesWithThePointerToAnotherScreenAndStaysAwayThere) {
+    if (!s_screensExist) {
+        GTEST_SKIP() << "xrandr cannot divide this screen";
+    }
+    window().resize(window().minimumSize());
+    ASSERT_TRUE(runUntil([&] { return window().geometry().right() < 640; }));
+    screen->moveTo(400, 400);
+    ASSERT_TRUE(key("F11", [&] { return window().isFullScreen() && window().menuBar()->height() == 0; }));
+    ASSERT_TRUE(runUntil([&] { return window().width() == 640; })) << window().width() << ": one screen is not full";
+    screen->moveTo(400, 0);
+    ASSERT_TRUE(runUntil([&] { return window().menuBar()->height() > 0; }, std::chrono::seconds(5)));
+    screen->moveTo(900, 0);
+    EXPECT_TRUE(runUntil([&] { return window().menuBar()->height() == 0; }, std::chrono::seconds(5)));
+    screen->moveTo(950, 1);
+    QKeyEvent something(QEvent::KeyRelease, Qt::Key_Shift, Qt::NoModifier); // has the window look where the pointer is
+    QCoreApplication::sendEvent(&window(), &something);
+    EXPECT_EQ(window().menuBar()->maximumHeight(), 0);
+    screen->moveTo(400, 1);
+    EXPECT_TRUE(runUntil([&] { return window().menuBar()->height() > 0; }, std::chrono::seconds(5)));
+}
 
 TEST_F(TwoScreensTest, MenusAndShortcutsWorkAfterTheWindowHasMovedToAScreenWithAnotherScale) {
     if (!s_screensExist) {
