@@ -3,10 +3,13 @@
 #include "tests/platform/LogCapture.h"
 #include "tests/platform/TemporaryDirectory.h"
 
+#include <array>
 #include <fstream>
 #include <gmock/gmock.h>
 #include <iterator>
+#include <linux/capability.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 namespace qivo {
@@ -117,15 +120,35 @@ TEST_F(PreferencesTest, FileBeyondTheLimitIsNotReadAndLeftAlone) {
     EXPECT_THAT(log.take(), ElementsAre(HasSubstr("larger than 1048576 bytes")));
 }
 
-TEST_F(PreferencesTest, FileThatCannotBeReadIsLeftAlone) {
-    if (geteuid() == 0) {
-        GTEST_SKIP() << "root reads every file";
+/// Takes from this thread, for a while, what lets root read and write every file.
+class AsAnyUser {
+  public:
+    AsAnyUser() {
+        syscall(SYS_capget, &m_header, m_before.data());
+        auto without = m_before;
+        without[0].effective &= ~(1U << CAP_DAC_OVERRIDE | 1U << CAP_DAC_READ_SEARCH);
+        syscall(SYS_capset, &m_header, without.data());
     }
+    ~AsAnyUser() { syscall(SYS_capset, &m_header, m_before.data()); }
+    AsAnyUser(const AsAnyUser&) = delete;
+    AsAnyUser& operator=(const AsAnyUser&) = delete;
+
+  private:
+    __user_cap_header_struct m_header{_LINUX_CAPABILITY_VERSION_3, 0};
+    std::array<__user_cap_data_struct, _LINUX_CAPABILITY_U32S_3> m_before{};
+};
+
+TEST_F(PreferencesTest, FileThatCannotBeReadIsLeftAlone) {
     directory.write("app.conf", "[General]\nswitch=true\n");
     chmod(file.c_str(), 0200);
-    Preferences preferences = open();
-    EXPECT_EQ(preferences.boolForKey(kSwitch), std::nullopt);
-    preferences.setBool(false, kSwitch);
+    {
+        const AsAnyUser user;
+        ASSERT_NE(access(file.c_str(), W_OK), -1);
+        ASSERT_EQ(contentOf(file), "");
+        Preferences preferences = open();
+        EXPECT_EQ(preferences.boolForKey(kSwitch), std::nullopt);
+        preferences.setBool(false, kSwitch);
+    }
     chmod(file.c_str(), 0600);
     EXPECT_THAT(contentOf(file), HasSubstr("switch=true"));
     EXPECT_THAT(log.take(), ElementsAre(HasSubstr("cannot be read")));
