@@ -8,6 +8,8 @@
 
 #include <array>
 #include <atomic>
+#include <chrono>
+#include <future>
 #include <gmock/gmock.h>
 #include <limits>
 #include <thread>
@@ -229,6 +231,25 @@ TEST_F(AppDataTest, ClearingThePTZSourceWithoutOneSendsNoNotice) {
     EXPECT_THAT(notices.take(), ElementsAre("hasPTZControl"));
 }
 
+TEST_F(AppDataTest, SelectingForgetsThePTZSourceBeforeItTakesTheLock) {
+    const auto model = make();
+    model->setQIVOSourceInfoNamed("before", "u");
+    model->setPtzSource(receiver());
+    std::future<QString> other;
+    QObject::connect(model.get(), &AppData::hasPTZControlChanged, model.get(), [&] {
+        other = std::async(std::launch::async, [&] {
+            QString name;
+            QString url;
+            model->getQIVOSourceInfoNamed(name, url);
+            return name;
+        });
+        EXPECT_EQ(other.wait_for(std::chrono::seconds(5)), std::future_status::ready) << "the lock is held";
+    });
+    model->setQIVOSourceInfoNamed("after", "u");
+    ASSERT_TRUE(other.valid());
+    EXPECT_EQ(other.get(), "before");
+}
+
 TEST_F(AppDataTest, SettingThePTZSourceSendsNoNotice) {
     const auto model = make();
     Notices notices(*model);
@@ -309,6 +330,37 @@ TEST_F(AppDataTest, SharedModelIsMadeOnceThoughManyThreadsAskAtOnce) {
     }
     EXPECT_NE(found[0], nullptr);
     EXPECT_THAT(found, testing::Each(found[0]));
+}
+
+TEST_F(AppDataTest, AddressOfThePageIsNeverTornThoughSeveralThreadsWriteIt) {
+    const auto model = make();
+    // The length of each is told by its character, so that a mixture of two shows.
+    const auto address = [](int kind) { return QString(16 + 8 * kind, QChar('a' + kind)); };
+    std::atomic<bool> done = false;
+    std::atomic<int> torn = 0;
+    std::vector<std::thread> threads;
+    threads.reserve(4);
+    for (int writer = 0; writer < 2; ++writer) {
+        threads.emplace_back([&, writer] {
+            for (int i = 0; !done; ++i) {
+                model->setDeviceWebpageURL(address((2 * i + writer) % 20));
+            }
+        });
+    }
+    std::atomic<int> reads = 0;
+    for (int reader = 0; reader < 2; ++reader) {
+        threads.emplace_back([&] {
+            while (!done) {
+                const QString seen = model->deviceWebpageURL();
+                torn += static_cast<int>(!seen.isEmpty() && seen != address(seen.at(0).unicode() - 'a'));
+                done = ++reads >= 20000;
+            }
+        });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+    EXPECT_EQ(torn, 0);
 }
 
 TEST_F(AppDataTest, ReadersOfThePairNeverSeeHalvesOfTwoSelections) {

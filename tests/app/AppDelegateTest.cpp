@@ -261,6 +261,18 @@ TEST_F(SelectionTest, SelectionTitlesTheMainWindowLiterallyAndEndsARecording) {
     EXPECT_EQ(window.windowTitle(), "A [*][*] & B");
 }
 
+TEST_F(SelectionTest, WindowHasItsNewTitleBeforeTheRecordingEnds) {
+    MainWindow window;
+    setMainWindow(&window);
+    model.setIsRecording(true);
+    std::vector<QString> titles;
+    QObject context;
+    QObject::connect(&model, &AppData::isRecordingChanged, &context, [&] { titles.push_back(window.windowTitle()); });
+    select(0);
+    EXPECT_THAT(titles, ElementsAre("STUDIO (Cam 1)"));
+    setMainWindow(nullptr);
+}
+
 TEST_F(AppDelegateTest, PagesThatShipWithTheApplicationAreOpened) {
     AppDelegate delegate;
     delegate.gotoOrvaneHomePage();
