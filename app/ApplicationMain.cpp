@@ -35,8 +35,8 @@ void reportMissingLibrary() {
 int applicationMain(int argc, char** argv) {
     const auto application = makeApplication(argc, argv);
     const TerminationSignals signalsToEnd;
-    QObject::connect(&signalsToEnd, &TerminationSignals::received, application.get(), &QApplication::quit);
     Interface interface;
+    QObject::connect(&signalsToEnd, &TerminationSignals::received, &interface, &Interface::terminate);
     reportMissingLibrary();
     AppDelegate& delegate = interface.delegate();
     QGuiApplication::setQuitOnLastWindowClosed(delegate.applicationShouldTerminateAfterLastWindowClosed());

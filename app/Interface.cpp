@@ -29,10 +29,17 @@ Interface::Interface()
     m_windowController->windowDidLoad();
 }
 
-Interface::~Interface() = default;
+/// A window that goes open closes its receiver, which the model announces when the menus' commands have gone already.
+Interface::~Interface() {
+    m_delegate->theModel()->disconnect(this);
+}
 
 PTZPanel* Interface::ptzPanel() const {
     return m_ptzPanel && m_ptzPanel->isVisible() ? m_ptzPanel.data() : nullptr;
+}
+
+void Interface::terminate() {
+    QCoreApplication::exit();
 }
 
 void Interface::loadMenus() {
@@ -46,7 +53,7 @@ void Interface::loadMenus() {
     addCommand(m_ui->actionWebControlPage, &AppDelegate::gotoDeviceWebpage);
     addCommand(m_ui->actionCameraControl, &AppDelegate::showPTZControl);
     addCommand(m_ui->actionRecordingFolder, &AppDelegate::setRecordPath);
-    connect(m_ui->actionQuit, &QAction::triggered, qApp, &QApplication::quit, Qt::QueuedConnection);
+    connect(m_ui->actionQuit, &QAction::triggered, this, &Interface::terminate, Qt::QueuedConnection);
     connect(m_ui->actionFullScreen, &QAction::triggered, m_window.get(), &MainWindow::setFullScreen);
     connect(m_ui->actionLeaveFullScreen, &QAction::triggered, m_window.get(),
             [this] { m_window->setFullScreen(false); });
@@ -122,6 +129,7 @@ void Interface::showPTZPanel() {
     if (ptzPanel() == nullptr) {
         m_ptzPanel = std::make_unique<PTZPanel>(m_window.get()).release(); // the window owns it
         connect(m_window.get(), &MainWindow::willClose, m_ptzPanel, &QWidget::close);
+        connect(qApp, &QCoreApplication::aboutToQuit, m_ptzPanel, &QWidget::close); // no camera is left moving
     }
     m_ptzPanel->present();
 }

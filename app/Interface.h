@@ -38,6 +38,10 @@ class Interface : public QObject {
     /// The panel for the camera; null while it is not open.
     PTZPanel* ptzPanel() const;
 
+    /// Ends the application in the controller's order. The toolkit's own way to quit would close the window first, and
+    /// with it a recording, before the player and the finder.
+    static void terminate();
+
     /// Enables and disables a menu's commands as the controller says. Entries without a command stay as they are.
     void validateMenu(QMenu* menu) const;
 

@@ -382,6 +382,16 @@ TEST_F(UserTest, ClosingTheWindowWhileReceivingEndsRecordingThenTheReceiver) {
     EXPECT_EQ(fake.openReceivers(), 0);
 }
 
+TEST_F(UserTest, InterfaceThatGoesWhileItReceivesTakesTheReceiverAlong) {
+    model.setQIVOSourceInfoNamed("STAGE (Wide)", "fake://wide");
+    ASSERT_TRUE(runUntil([&] { return fake.openReceivers() == 1; }));
+    pinGraphicsDriver();
+    interface.reset();
+    EXPECT_EQ(fake.openReceivers(), 0);
+    EXPECT_EQ(fake.calls().back(), "destroy()");
+    interface = std::make_unique<Interface>(); // what the test ends with
+}
+
 /// The panel that steers the camera, opened from the window.
 class PanelTest : public UserTest {
   protected:
@@ -469,6 +479,14 @@ TEST_F(PanelTest, ClosingTheWindowClosesThePanelWithoutACameraToo) {
     ASSERT_NO_FATAL_FAILURE(openPanel());
     window().close();
     EXPECT_TRUE(runUntil([&] { return interface->ptzPanel() == nullptr && !panelIsShown(); }));
+}
+
+TEST_F(PanelTest, TerminationClosesThePanel) {
+    ASSERT_NO_FATAL_FAILURE(openPanel());
+    QMetaObject::invokeMethod(qApp, &Interface::terminate, Qt::QueuedConnection);
+    EXPECT_EQ(QCoreApplication::exec(), 0);
+    EXPECT_EQ(interface->ptzPanel(), nullptr);
+    EXPECT_TRUE(window().isVisible()) << "the window goes with the interface";
 }
 
 TEST_F(PanelTest, KeysOfTheWindowWorkInThePanelAndDoNotClashWithItsOwn) {

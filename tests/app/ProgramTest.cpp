@@ -92,6 +92,38 @@ TEST_F(ProgramTest, SignalEndsItInItsUsualOrder) {
     }
 }
 
+TEST_F(ProgramTest, TerminationEndsThePlayerThenTheFinderThenTheRecorderThenSavesTheSettings) {
+    const std::string notes = folder.path("notes");
+    const std::string recorder = "/usr/local/bin/Application.Mac.QIVO.Recording"; // in a folder of this test's own
+    std::ofstream(recorder) << "#!/bin/sh\n"
+                            << "trap 'test -e \"" << preferences() << "\" && saved=saved || saved=unsaved\n"
+                            << "      echo \"recorder goes, $saved\" >>\"" << notes << "\"; exit 0' INT\n"
+                            << "echo recorder comes >>\"" << notes << "\"\n"
+                            << "while echo; do sleep 0.05; done\n";
+    std::filesystem::permissions(recorder, std::filesystem::perms::owner_all);
+    const auto noted = [&] {
+        std::ifstream file(notes);
+        return std::string(std::istreambuf_iterator<char>(file), {});
+    };
+    const auto program = start({std::string("LD_LIBRARY_PATH=") + STAND_INS + "/complete", "STAND_IN_NOTES=" + notes});
+    ASSERT_TRUE(waitForWindow());
+    screen->activate(*screen->findWindow("QIVO Viewer"));
+    ASSERT_TRUE(eventually([&] {
+        for (const char* key : {"Alt+s", "Right", "Return"}) {
+            screen->key(key);
+        }
+        return eventually([&] { return screen->findWindow("STUDIO (Cam 1)").has_value(); }, std::chrono::seconds(1));
+    }));
+    ASSERT_TRUE(eventually([&] { return noted().find("sound comes\n") != std::string::npos; })) << noted();
+    screen->key("Control+r");
+    ASSERT_TRUE(eventually([&] { return noted().find("recorder comes\n") != std::string::npos; })) << noted();
+    const std::size_t before = noted().size();
+    program->signal(SIGTERM);
+    EXPECT_EQ(program->wait(kSoon), 0);
+    EXPECT_EQ(noted().substr(before), "sound goes\nfinder goes\nrecorder goes, unsaved\nvideo goes\n");
+    EXPECT_THAT(saved(), HasSubstr("ORVQIVOViewer_mute=false"));
+}
+
 TEST_F(ProgramTest, FolderForRecordingsIsChosenInASheetThatDoesNotKeepASignalFromEndingIt) {
     std::filesystem::create_directory(folder.path("takes"));
     const auto program = startWithLibrary();

@@ -1,7 +1,30 @@
-// A libqivo that only says that it was called.
+// A libqivo that only says that it was called. With STAND_IN_NOTES in the environment it knows one source, and notes in
+// that file when a finder or a receiver goes.
 #include "sdk/qivo.h"
 
 #include <cstdio>
+#include <cstdlib>
+#include <utility>
+
+namespace {
+
+const char* notes() {
+    return std::getenv("STAND_IN_NOTES");
+}
+
+void note(const char* text) {
+    if (std::FILE* file = notes() != nullptr ? std::fopen(notes(), "a") : nullptr) {
+        std::fprintf(file, "%s\n", text);
+        std::fclose(file);
+    }
+}
+
+/// Handles; all that is known of a receiver is what it receives.
+char finder = 0;
+char video = 0;
+char sound = 0;
+
+} // namespace
 
 extern "C" {
 bool QIVOlib_initialize(void) {
@@ -16,19 +39,36 @@ void QIVOlib_destroy(void) {
     std::puts("stand-in: destroy");
 }
 QIVOlib_find_instance_t QIVOlib_find_create_v2(const QIVOlib_find_create_t*) {
-    return nullptr;
+    return notes() != nullptr ? reinterpret_cast<QIVOlib_find_instance_t>(&finder) : nullptr;
 }
-void QIVOlib_find_destroy(QIVOlib_find_instance_t) {}
+void QIVOlib_find_destroy(QIVOlib_find_instance_t) {
+    note("finder goes");
+}
 bool QIVOlib_find_wait_for_sources(QIVOlib_find_instance_t, uint32_t) {
-    return true;
+    static bool changed = true;
+    return std::exchange(changed, false);
 }
-const QIVOlib_source_t* QIVOlib_find_get_current_sources(QIVOlib_find_instance_t, uint32_t*) {
-    return nullptr;
+const QIVOlib_source_t* QIVOlib_find_get_current_sources(QIVOlib_find_instance_t instance, uint32_t* count) {
+    static const QIVOlib_source_t source{"STUDIO (Cam 1)", "stand-in://1"};
+    if (instance == nullptr) {
+        return nullptr;
+    }
+    *count = 1;
+    return &source;
 }
-QIVOlib_recv_instance_t QIVOlib_recv_create_v3(const QIVOlib_recv_create_v3_t*) {
-    return nullptr;
+QIVOlib_recv_instance_t QIVOlib_recv_create_v3(const QIVOlib_recv_create_v3_t* settings) {
+    if (notes() == nullptr) {
+        return nullptr;
+    }
+    const bool hears = settings->bandwidth == QIVOlib_recv_bandwidth_audio_only;
+    note(hears ? "sound comes" : "video comes");
+    return reinterpret_cast<QIVOlib_recv_instance_t>(hears ? &sound : &video);
 }
-void QIVOlib_recv_destroy(QIVOlib_recv_instance_t) {}
+void QIVOlib_recv_destroy(QIVOlib_recv_instance_t instance) {
+    if (instance != nullptr) {
+        note(instance == reinterpret_cast<QIVOlib_recv_instance_t>(&sound) ? "sound goes" : "video goes");
+    }
+}
 int32_t QIVOlib_recv_capture_v2(QIVOlib_recv_instance_t, QIVOlib_video_frame_v2_t*, QIVOlib_audio_frame_v2_t*,
                                 QIVOlib_metadata_frame_t*, uint32_t timeout) {
     return static_cast<int32_t>(timeout);
