@@ -21,7 +21,6 @@
 namespace qivo {
 namespace {
 
-using std::chrono::duration_cast;
 using std::chrono::microseconds;
 using std::chrono::milliseconds;
 using Clock = std::chrono::steady_clock;
@@ -122,8 +121,11 @@ class Activity::Conversation {
         askPortal();
         askLoginManager();
         serveUntil([this] { return m_ending; }, Clock::time_point::max());
+        // What has been asked is answered first, so that it can be let go.
+        const Clock::time_point deadline = Clock::now() + milliseconds(kEndTimeoutMs);
+        serveUntil([this] { return m_unanswered == 0; }, deadline);
         release();
-        serveUntil([this] { return m_releasing == 0; }, Clock::now() + milliseconds(kEndTimeoutMs));
+        serveUntil([this] { return m_unanswered == 0; }, deadline);
         m_session.reset();
         m_system.reset();
     }
@@ -148,10 +150,12 @@ class Activity::Conversation {
 
     /// Sends a request; `answered` gets the answer, or the error in its place. Nothing where it cannot be sent.
     template <typename... Arguments>
-    bool ask(const Bus& bus, const Method& method, sd_bus_message_handler_t answered, const char* types,
+    void ask(const Bus& bus, const Method& method, sd_bus_message_handler_t answered, const char* types,
              Arguments... arguments) {
-        return bus && sd_bus_call_method_async(bus.get(), nullptr, method.service, method.path, method.interface,
-                                               method.name, answered, this, types, arguments...) >= 0;
+        if (bus && sd_bus_call_method_async(bus.get(), nullptr, method.service, method.path, method.interface,
+                                            method.name, answered, this, types, arguments...) >= 0) {
+            ++m_unanswered;
+        }
     }
 
     void askPortal() {
@@ -161,6 +165,7 @@ class Activity::Conversation {
 
     static int portalAnswered(sd_bus_message* answer, void* self, sd_bus_error*) {
         auto& my = *static_cast<Conversation*>(self);
+        --my.m_unanswered;
         const char* request = nullptr;
         if (sd_bus_message_is_method_error(answer, nullptr) == 0 && sd_bus_message_read(answer, "o", &request) > 0) {
             my.m_portalRequest = request;
@@ -173,9 +178,11 @@ class Activity::Conversation {
     void askScreenSaver() { ask(m_session, kSaverInhibit, saverAnswered, "ss", kWho, m_reason.c_str()); }
 
     static int saverAnswered(sd_bus_message* answer, void* self, sd_bus_error*) {
+        auto& my = *static_cast<Conversation*>(self);
+        --my.m_unanswered;
         std::uint32_t cookie = 0;
         if (sd_bus_message_is_method_error(answer, nullptr) == 0 && sd_bus_message_read(answer, "u", &cookie) > 0) {
-            static_cast<Conversation*>(self)->m_saverCookie = cookie;
+            my.m_saverCookie = cookie;
         }
         return 0;
     }
@@ -186,27 +193,29 @@ class Activity::Conversation {
 
     /// The login manager's inhibitor is a descriptor: it holds until the last copy is closed.
     static int loginAnswered(sd_bus_message* answer, void* self, sd_bus_error*) {
+        auto& my = *static_cast<Conversation*>(self);
+        --my.m_unanswered;
         int lock = -1; // the message's
         if (sd_bus_message_is_method_error(answer, nullptr) == 0 && sd_bus_message_read(answer, "h", &lock) > 0) {
-            static_cast<Conversation*>(self)->m_loginLock = FileDescriptor(fcntl(lock, F_DUPFD_CLOEXEC, 0));
+            my.m_loginLock = FileDescriptor(fcntl(lock, F_DUPFD_CLOEXEC, 0));
         }
         return 0;
     }
 
-    /// What was asked and has not been answered ends with its connection, by which the services know who asked.
+    /// What has not been answered even now ends with its connection, by which the services know who asked.
     void release() {
         if (!m_portalRequest.empty()) {
             const Method close{kPortalService, m_portalRequest.c_str(), "org.freedesktop.portal.Request", "Close"};
-            m_releasing += static_cast<int>(ask(m_session, close, released, ""));
+            ask(m_session, close, released, "");
         }
         if (m_saverCookie) {
-            m_releasing += static_cast<int>(ask(m_session, kSaverUnInhibit, released, "u", *m_saverCookie));
+            ask(m_session, kSaverUnInhibit, released, "u", *m_saverCookie);
         }
         m_loginLock.reset();
     }
 
     static int released(sd_bus_message*, void* self, sd_bus_error*) {
-        --static_cast<Conversation*>(self)->m_releasing;
+        --static_cast<Conversation*>(self)->m_unanswered;
         return 0;
     }
 
@@ -220,7 +229,7 @@ class Activity::Conversation {
     std::optional<std::uint32_t> m_saverCookie;
     FileDescriptor m_loginLock;
     bool m_ending = false;
-    int m_releasing = 0; // releases that have not been answered
+    int m_unanswered = 0; // requests
 
     std::thread m_thread; // last, as it uses the others
 };
