@@ -332,37 +332,6 @@ TEST_F(AppDataTest, SharedModelIsMadeOnceThoughManyThreadsAskAtOnce) {
     EXPECT_THAT(found, testing::Each(found[0]));
 }
 
-TEST_F(AppDataTest, AddressOfThePageIsNeverTornThoughSeveralThreadsWriteIt) {
-    const auto model = make();
-    // The length of each is told by its character, so that a mixture of two shows.
-    const auto address = [](int kind) { return QString(16 + 8 * kind, QChar('a' + kind)); };
-    std::atomic<bool> done = false;
-    std::atomic<int> torn = 0;
-    std::vector<std::thread> threads;
-    threads.reserve(4);
-    for (int writer = 0; writer < 2; ++writer) {
-        threads.emplace_back([&, writer] {
-            for (int i = 0; !done; ++i) {
-                model->setDeviceWebpageURL(address((2 * i + writer) % 20));
-            }
-        });
-    }
-    std::atomic<int> reads = 0;
-    for (int reader = 0; reader < 2; ++reader) {
-        threads.emplace_back([&] {
-            while (!done) {
-                const QString seen = model->deviceWebpageURL();
-                torn += static_cast<int>(!seen.isEmpty() && seen != address(seen.at(0).unicode() - 'a'));
-                done = ++reads >= 20000;
-            }
-        });
-    }
-    for (std::thread& thread : threads) {
-        thread.join();
-    }
-    EXPECT_EQ(torn, 0);
-}
-
 TEST_F(AppDataTest, ReadersOfThePairNeverSeeHalvesOfTwoSelections) {
     const auto model = make();
     std::atomic<bool> done = false;
