@@ -54,7 +54,7 @@ std::vector<Node> nodesOf(const SoapReply& reply);
 std::vector<Preset> presetsOf(const SoapReply& reply);
 /// The token that SetPreset answered; empty if there is none.
 std::string presetOf(const SoapReply& reply);
-/// The positions of the focus; nothing if it cannot be put anywhere.
+/// The positions of the focus, from near to far; nothing if it cannot be put anywhere.
 std::optional<Range> focusOf(const SoapReply& reply);
 
 /// The profile by which the source with these stream URLs is steered.

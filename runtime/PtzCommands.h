@@ -36,7 +36,7 @@ struct PtzRequest {
     unsigned axes = 0;   ///< move: that move; stop and halt: that stop
     PtzSpeed speed{};    ///< move: speeds of `axes`; halt: of the other axes in motion
     unsigned moving = 0; ///< halt: the other axes in motion
-    float value = 0;     ///< focus: from 0 to 1; recall: the speed
+    float value = 0;     ///< focus: from 0 (far) to 1 (near); recall: the speed
     int preset = 0;      ///< store and recall
     std::uint64_t id = 0;
 };

@@ -28,6 +28,11 @@ onvif::Velocity velocityOf(unsigned axes, const PtzSpeed& speed) {
     return velocity;
 }
 
+/// ONVIF's positions grow with the distance, as its speeds of the focus are positive towards what is far.
+float focusPosition(const onvif::Range& range, float value) {
+    return range.most - value * (range.most - range.least);
+}
+
 SoapMessage messageOf(const OnvifCamera& camera, const PtzRequest& request) {
     switch (request.kind) {
     case Kind::stop:
@@ -36,8 +41,7 @@ SoapMessage messageOf(const OnvifCamera& camera, const PtzRequest& request) {
     case Kind::manualFocus:
         return onvif::setAutoFocus(camera.videoSource, request.kind == Kind::autoFocus);
     case Kind::focus:
-        return onvif::moveFocus(camera.videoSource,
-                                camera.focus->least + request.value * (camera.focus->most - camera.focus->least));
+        return onvif::moveFocus(camera.videoSource, focusPosition(*camera.focus, request.value));
     default:
         return onvif::continuousMove(camera.profile, velocityOf(request.axes | request.moving, request.speed),
                                      static_cast<int>(PtzCommands::kRunOut.count()));

@@ -221,7 +221,7 @@ QIVOLIB_API bool QIVOlib_recv_ptz_pan_tilt_speed(QIVOlib_recv_instance_t p_insta
 /** Hands the focus to the camera's automatic. */
 QIVOLIB_API bool QIVOlib_recv_ptz_auto_focus(QIVOlib_recv_instance_t p_instance);
 
-/** Takes the focus by hand: 0 is near infinity's end of the range, 1 the nearest. */
+/** Takes the focus by hand, to a place in the camera's range: 0 is the far end (infinity), 1 the near one. */
 QIVOLIB_API bool QIVOlib_recv_ptz_focus(QIVOlib_recv_instance_t p_instance, float focus_value);
 
 /** Keeps the camera's position as a preset, numbered from 0. */

@@ -74,6 +74,19 @@ TEST_F(SteeringCameraTest, WhatTheCameraIsIsAskedOnce) {
     EXPECT_EQ(camera.calls("GotoPreset")[0].after("Speed><tt:PanTilt x=\""), "0.2500");
 }
 
+TEST_F(SteeringCameraTest, TheFocusGoesFromFarToNear) {
+    ScriptedCamera camera;
+    const auto steering = steer(camera);
+    ASSERT_TRUE(found(*steering));
+    int moves = 0;
+    for (const auto& [value, position] : {std::pair{0.0F, "20.0000"}, {1.0F, "10.0000"}, {0.25F, "17.5000"}}) {
+        EXPECT_TRUE(steering->focus(value));
+        ASSERT_TRUE(camera.until([&, asked = moves] { return camera.count("Move") > asked; }));
+        EXPECT_EQ(camera.calls("Move").back().after("Position>"), position) << "ONVIF's positions grow to what is far";
+        ++moves;
+    }
+}
+
 TEST_F(SteeringCameraTest, NothingIsAcceptedThatTheCameraCannotDo) {
     ScriptedCamera camera([](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
         const std::string nodes = "<R><tptz:PTZNode token=\"node\"><tt:SupportedPTZSpaces>"

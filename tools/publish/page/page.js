@@ -269,6 +269,9 @@ for (let number = 1; number <= 9; ++number) {
 }
 element("store").addEventListener("click", () => setStoring(!storing));
 
+// The slider goes from far to near, as on a panel; the camera counts from near to far.
+const otherWay = (focus) => Math.round((1 - focus) * 100) / 100;
+
 let focusTouched = 0;
 element("focus").addEventListener("input", () => {
     focusTouched = performance.now();
@@ -278,7 +281,7 @@ element("focus").addEventListener("input", () => {
     if (earlier >= 0) {
         waiting.splice(earlier, 1);
     }
-    ask({command: "focus", value: Number(element("focus").value)});
+    ask({command: "focus", value: otherWay(element("focus").value)});
 });
 element("automatic").addEventListener("change", () => {
     focusTouched = performance.now();
@@ -355,7 +358,7 @@ function show(state) {
         button.title = kept ? "Holds a position" : "Empty";
     });
     if (performance.now() - focusTouched > 1500) {
-        element("focus").value = state.focus;
+        element("focus").value = otherWay(state.focus);
         element("automatic").checked = state.automaticFocus;
     }
 }
