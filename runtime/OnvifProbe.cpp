@@ -38,17 +38,12 @@ bool OnvifProbe::fail(std::string reason) {
     return false;
 }
 
-/// A device that does not tell its time in a way that can be read tells it in the header of its answer.
 bool OnvifProbe::readClock() {
     const auto answer = ask(m_target.device, onvif::getSystemDateAndTime());
     if (answer.status == 0) {
         return fail(answer.failure);
     }
-    auto clock = answer.reply ? onvif::clockOf(*answer.reply) : std::nullopt;
-    clock = clock ? clock : answer.date;
-    if (clock) {
-        m_client.setClockDifference(*clock - std::chrono::system_clock::now());
-    }
+    m_client.takeClock(answer);
     return true;
 }
 

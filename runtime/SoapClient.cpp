@@ -2,6 +2,8 @@
 
 #include "runtime/GstHandles.h"
 #include "runtime/OnvifLogin.h"
+#include "runtime/OnvifMessages.h"
+#include "runtime/OnvifReplies.h"
 
 #include <algorithm>
 #include <array>
@@ -56,6 +58,12 @@ std::optional<std::chrono::system_clock::time_point> dateOf(SoupMessageHeaders* 
     const std::unique_ptr<GDateTime, FreeTime> date(text != nullptr ? soup_date_time_new_from_http_string(text)
                                                                     : nullptr);
     return date ? std::optional(std::chrono::system_clock::from_time_t(g_date_time_to_unix(date.get()))) : std::nullopt;
+}
+
+/// Devices say so by HTTP, by a fault, or by both; some call everything a bad request.
+bool refusesLogin(const SoapClient::Answer& answer) {
+    return answer.status == SOUP_STATUS_BAD_REQUEST || answer.status == SOUP_STATUS_UNAUTHORIZED ||
+           answer.status == SOUP_STATUS_FORBIDDEN || (answer.reply && answer.reply->refusesLogin());
 }
 
 SoupSession* newSession() {
@@ -165,8 +173,20 @@ SoapClient::~SoapClient() {
     }
 }
 
+void SoapClient::takeClock(const Answer& answer) {
+    auto clock = answer.reply ? onvif::clockOf(*answer.reply) : std::nullopt;
+    clock = clock ? clock : answer.date;
+    if (clock) {
+        m_ahead = *clock - std::chrono::system_clock::now();
+    }
+}
+
+bool SoapClient::mayLogIn(const std::string& host, const SoapMessage& message) const {
+    return !message.open && m_target.login && sameHost(host, m_target.loginHost);
+}
+
 std::string SoapClient::headerFor(const std::string& host, const SoapMessage& message) const {
-    if (message.open || !m_target.login || !sameHost(host, m_target.loginHost)) {
+    if (!mayLogIn(host, message)) {
         return {};
     }
     return securityHeader(*m_target.login, newNonce(), std::chrono::system_clock::now() + m_ahead);
@@ -174,13 +194,57 @@ std::string SoapClient::headerFor(const std::string& host, const SoapMessage& me
 
 void SoapClient::post(const std::string& url, const SoapMessage& message, std::chrono::milliseconds limit,
                       Answered answered) {
+    const Clock::time_point end = Clock::now() + limit;
+    if (!mayLogIn(hostOf(url), message)) {
+        begin(url, message, end, std::move(answered));
+        return;
+    }
+    begin(url, message, end, [=, this, ahead = m_ahead](Answer answer) {
+        if (!answer.refusesLogin) {
+            answered(std::move(answer));
+            return;
+        }
+        readClock(end, [=, this, refusal = std::make_shared<Answer>(std::move(answer))] {
+            if (std::chrono::abs(m_ahead - ahead) >= kClockStep && Clock::now() < end) {
+                begin(url, message, end, answered);
+            } else {
+                answered(std::move(*refusal));
+            }
+        });
+    });
+}
+
+/// Calls `then` when the clock has been read, or at once where that was a moment ago.
+void SoapClient::readClock(Clock::time_point end, std::function<void()> then) {
+    if (m_awaitsClock.empty() && Clock::now() < m_nextClock) {
+        then();
+        return;
+    }
+    m_awaitsClock.push_back(std::move(then));
+    if (m_awaitsClock.size() == 1) {
+        m_nextClock = Clock::now() + kClockPause;
+        begin(m_target.device, onvif::getSystemDateAndTime(), end, [this](const Answer& answer) {
+            takeClock(answer);
+            clockRead();
+        });
+    }
+}
+
+void SoapClient::clockRead() {
+    for (const auto& then : std::exchange(m_awaitsClock, {})) {
+        then();
+    }
+}
+
+void SoapClient::begin(const std::string& url, const SoapMessage& message, Clock::time_point end, Answered answered) {
+    const auto left = std::chrono::ceil<std::chrono::milliseconds>(end - std::min(end, Clock::now()));
     m_exchanges.push_back(std::make_unique<Exchange>());
     Exchange& exchange = *m_exchanges.back();
     exchange.client = this;
     exchange.url = url;
     exchange.soap = message;
     exchange.answered = std::move(answered);
-    exchange.limit.reset(g_timeout_source_new(static_cast<guint>(limit.count())));
+    exchange.limit.reset(g_timeout_source_new(static_cast<guint>(left.count())));
     g_source_set_callback(exchange.limit.get(), Callbacks::late, &exchange, nullptr);
     g_source_attach(exchange.limit.get(), m_context);
     send(exchange);
@@ -244,6 +308,7 @@ SoapClient::Answer SoapClient::answerOf(const Exchange& exchange) {
     answer.date = dateOf(soup_message_get_response_headers(exchange.message.get()));
     answer.reply = SoapReply::parse(exchange.body);
     const bool blank = exchange.body.find_first_not_of(" \t\r\n") == std::string::npos;
+    answer.refusesLogin = refusesLogin(answer);
     if (answer.reply && answer.reply->isFault()) {
         answer.failure = "it refuses: " + answer.reply->reason();
     } else if (answer.status >= 300) {
@@ -277,7 +342,11 @@ SoapClient::Answer SoapClient::ask(const std::string& url, const SoapMessage& me
     while (!*answer && !ended()) {
         g_main_context_iteration(m_context, TRUE);
     }
-    return *answer ? std::move(**answer) : Answer{0, std::nullopt, "given up", {}};
+    if (!*answer) {
+        *answer = Answer{};
+        (*answer)->failure = "given up";
+    }
+    return std::move(**answer);
 }
 
 } // namespace qivo::runtime

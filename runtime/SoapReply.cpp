@@ -1,5 +1,6 @@
 #include "runtime/SoapReply.h"
 
+#include <algorithm>
 #include <cmath>
 #include <glib.h>
 #include <libxml/parser.h>
@@ -159,6 +160,20 @@ XmlElement SoapReply::body() const {
 
 XmlElement SoapReply::content() const {
     return body().child("");
+}
+
+/// By ONVIF's code or WS-Security's, wherever in the codes of SOAP 1.2 or 1.1 they stand.
+bool SoapReply::refusesLogin() const {
+    if (!isFault()) {
+        return false;
+    }
+    std::vector<XmlElement> codes = content().child("Code").all("Value");
+    codes.push_back(content().child("faultcode"));
+    return std::any_of(codes.begin(), codes.end(), [](const XmlElement& code) {
+        const std::string text = code.text();
+        return text.find("NotAuthorized") != std::string::npos ||
+               text.find("FailedAuthentication") != std::string::npos;
+    });
 }
 
 std::string SoapReply::reason() const {

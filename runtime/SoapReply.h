@@ -58,6 +58,8 @@ class SoapReply {
     /// The body's first element, normally the operation's response.
     XmlElement content() const;
     bool isFault() const { return content().name() == "Fault"; }
+    /// Whether it is a fault that says that the login was not accepted.
+    bool refusesLogin() const;
     /// Why it is a fault, in the device's words.
     std::string reason() const;
 
