@@ -23,6 +23,16 @@ void PresetTable::stored(int number, const std::string& token) {
     }
 }
 
+void PresetTable::forget(const std::string& token) {
+    std::erase_if(m_presets, [&](const onvif::Preset& preset) { return preset.token == token; });
+    std::erase_if(m_stored, [&](const auto& entry) { return entry.second == token; });
+}
+
+bool PresetTable::lists(const std::string& token) const {
+    return std::any_of(m_presets.begin(), m_presets.end(),
+                       [&](const onvif::Preset& preset) { return preset.token == token; });
+}
+
 bool PresetTable::isStored(const std::string& token) const {
     return std::any_of(m_stored.begin(), m_stored.end(), [&](const auto& entry) { return entry.second == token; });
 }

@@ -23,6 +23,10 @@ class PresetTable {
     void read(std::vector<onvif::Preset> presets) { m_presets = std::move(presets); }
     /// The camera has answered a token for the number.
     void stored(int number, const std::string& token);
+    /// The camera does not know the token any more.
+    void forget(const std::string& token);
+    /// Whether the camera said that it has the token.
+    bool lists(const std::string& token) const;
     /// The token for the number; empty if there is none.
     std::string tokenOf(int number) const;
 

@@ -56,6 +56,10 @@ std::chrono::milliseconds limitOf(Kind kind) {
     return kind == Kind::stop || kind == Kind::halt ? Steering::kStopLimit : Steering::kCommandLimit;
 }
 
+std::string noPreset(const PtzRequest& request) {
+    return "it has no preset " + std::to_string(request.preset);
+}
+
 } // namespace
 
 void Steering::ContextRelease::operator()(GMainContext* context) const {
@@ -222,10 +226,8 @@ void Steering::serve(SoapClient& client) {
 }
 
 void Steering::ask(SoapClient& client, const PtzRequest& request) {
-    if (request.kind == Kind::recall) {
-        recallPreset(client, request);
-    } else if (request.kind == Kind::store) {
-        storePreset(client, request);
+    if (request.kind == Kind::recall || request.kind == Kind::store) {
+        askPreset(client, request);
     } else {
         // The camera is set once and before the first command, so reading it here needs no lock.
         const onvif::Services& services = m_camera->services;
@@ -239,42 +241,70 @@ void Steering::post(SoapClient& client, const std::string& service, const SoapMe
                 [this, request](const SoapClient::Answer& answer) { done(request, answer); });
 }
 
-void Steering::storePreset(SoapClient& client, const PtzRequest& request) {
-    const SoapMessage message =
-        onvif::setPreset(m_camera->profile, PresetTable::nameOf(request.preset), m_presets.tokenOf(request.preset));
-    client.post(m_camera->services.ptz, message, kCommandLimit, [this, request](const SoapClient::Answer& answer) {
-        if (answer.accepted() && answer.reply) {
-            m_presets.stored(request.preset, onvif::presetOf(*answer.reply));
+/// Asks for the presets again if the number is not known: somebody else may have stored it.
+void Steering::askPreset(SoapClient& client, const PtzRequest& request) {
+    if (!m_presets.tokenOf(request.preset).empty()) {
+        usePreset(client, request, true);
+        return;
+    }
+    readPresets(client, [this, &client, request](SoapClient::Answer answer) {
+        const bool isThere = !m_presets.tokenOf(request.preset).empty();
+        if (stillWanted(request) && (isThere || request.kind == Kind::store)) {
+            usePreset(client, request, true);
+            return;
+        }
+        if (answer.accepted() && !isThere) {
+            answer.failure = noPreset(request);
         }
         done(request, answer);
     });
 }
 
-/// Asks for the presets again if the number is not known: somebody else may have stored it.
-void Steering::recallPreset(SoapClient& client, const PtzRequest& request) {
-    const auto go = [this, &client, request](const std::string& token) {
-        const auto speed = m_camera->node.speeds ? std::optional(request.value) : std::nullopt;
-        post(client, m_camera->services.ptz, onvif::gotoPreset(m_camera->profile, token, speed), request);
-    };
-    if (const std::string token = m_presets.tokenOf(request.preset); !token.empty()) {
-        go(token);
-        return;
-    }
-    const SoapMessage message = onvif::getPresets(m_camera->profile);
-    client.post(m_camera->services.ptz, message, kCommandLimit, [this, request, go](SoapClient::Answer answer) {
-        if (answer.reply && answer.accepted()) {
-            m_presets.read(onvif::presetsOf(*answer.reply));
+void Steering::usePreset(SoapClient& client, const PtzRequest& request, bool first) {
+    const std::string token = m_presets.tokenOf(request.preset);
+    const bool stores = request.kind == Kind::store;
+    const auto speed = m_camera->node.speeds ? std::optional(request.value) : std::nullopt;
+    const SoapMessage message = stores ? onvif::setPreset(m_camera->profile, PresetTable::nameOf(request.preset), token)
+                                       : onvif::gotoPreset(m_camera->profile, token, speed);
+    client.post(m_camera->services.ptz, message, kCommandLimit,
+                [this, &client, request, token, stores, first](const SoapClient::Answer& answer) {
+                    if (stores && answer.accepted() && answer.reply) {
+                        m_presets.stored(request.preset, onvif::presetOf(*answer.reply));
+                    }
+                    if (!answer.accepted() && answer.status != 0 && first && stillWanted(request)) {
+                        askAnew(client, request, token, answer);
+                    } else {
+                        done(request, answer);
+                    }
+                });
+}
+
+/// Once more where the camera means another preset by now: others take presets away and store them again.
+void Steering::askAnew(SoapClient& client, const PtzRequest& request, const std::string& token,
+                       const SoapClient::Answer& refusal) {
+    readPresets(client, [this, &client, request, token, failure = refusal.failure](SoapClient::Answer answer) {
+        if (!answer.accepted() || !m_presets.lists(token)) {
+            m_presets.forget(token);
         }
-        const std::string token = m_presets.tokenOf(request.preset);
-        if (!token.empty() && stillWanted(request)) {
-            go(token);
+        const std::string other = m_presets.tokenOf(request.preset);
+        const bool canBe = !other.empty() || request.kind == Kind::store;
+        if (other != token && canBe && stillWanted(request)) {
+            usePreset(client, request, false);
             return;
         }
-        if (answer.accepted() && token.empty()) {
-            answer.failure = "it has no preset " + std::to_string(request.preset);
-        }
+        answer.failure = canBe ? failure : noPreset(request);
         done(request, answer);
     });
+}
+
+void Steering::readPresets(SoapClient& client, const SoapClient::Answered& then) {
+    client.post(m_camera->services.ptz, onvif::getPresets(m_camera->profile), kCommandLimit,
+                [this, then](SoapClient::Answer answer) {
+                    if (answer.reply && answer.accepted()) {
+                        m_presets.read(onvif::presetsOf(*answer.reply));
+                    }
+                    then(std::move(answer));
+                });
 }
 
 bool Steering::stillWanted(const PtzRequest& request) {

@@ -69,8 +69,11 @@ class Steering : public std::enable_shared_from_this<Steering> {
     void serve(SoapClient& client);
     void pause(Clock::time_point until);
     void ask(SoapClient& client, const PtzRequest& request);
-    void recallPreset(SoapClient& client, const PtzRequest& request);
-    void storePreset(SoapClient& client, const PtzRequest& request);
+    void askPreset(SoapClient& client, const PtzRequest& request);
+    void usePreset(SoapClient& client, const PtzRequest& request, bool first);
+    void askAnew(SoapClient& client, const PtzRequest& request, const std::string& token,
+                 const SoapClient::Answer& refusal);
+    void readPresets(SoapClient& client, const SoapClient::Answered& then);
     void post(SoapClient& client, const std::string& service, const SoapMessage& message, const PtzRequest& request);
     void done(const PtzRequest& request, const SoapClient::Answer& answer);
     bool stillWanted(const PtzRequest& request);

@@ -311,6 +311,12 @@ TEST(PresetTable, KnowsPresetsByNameTokenOrMemory) {
     presets.stored(5, "");
     EXPECT_EQ(presets.tokenOf(5), "");
     EXPECT_EQ(PresetTable::nameOf(5), "QIVO 5");
+    EXPECT_TRUE(presets.lists("4"));
+    presets.forget("4");
+    EXPECT_FALSE(presets.lists("4"));
+    EXPECT_EQ(presets.tokenOf(7), "");
+    presets.forget("3");
+    EXPECT_EQ(presets.tokenOf(9), "");
 }
 
 } // namespace
