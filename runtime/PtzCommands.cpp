@@ -57,8 +57,14 @@ bool PtzCommands::store(int preset) {
 }
 
 bool PtzCommands::recall(int preset, float speed) {
-    return preset >= 0 && preset <= kLastPreset && !std::isnan(speed) &&
-           enqueue({.kind = Kind::recall, .axes = kPanTiltAxes | kZoomAxis, .value = cut(speed, 0), .preset = preset});
+    const PtzRequest request{
+        .kind = Kind::recall, .axes = kPanTiltAxes | kZoomAxis, .value = cut(speed, 0), .preset = preset};
+    if (preset < 0 || preset > kLastPreset || std::isnan(speed) || !enqueue(request)) {
+        return false;
+    }
+    m_recall = request;
+    m_recallAgain = false;
+    return true;
 }
 
 bool PtzCommands::speeds(unsigned axes, const PtzSpeed& speed) {
@@ -69,6 +75,7 @@ bool PtzCommands::speeds(unsigned axes, const PtzSpeed& speed) {
         stop(axes);
         return true;
     }
+    forgetRecall();
     if (m_waiting.empty() || m_waiting.back().kind != Kind::move) {
         return enqueue({.kind = Kind::move, .axes = axes, .speed = speed});
     }
@@ -85,10 +92,24 @@ bool PtzCommands::enqueue(const PtzRequest& request) {
     return true;
 }
 
+void PtzCommands::forgetRecall() {
+    m_recall.reset();
+    m_recallAgain = false;
+}
+
 void PtzCommands::stop(unsigned axes) {
-    for (PtzRequest& waiting : m_waiting) {
-        waiting.axes = waiting.kind == Kind::recall ? 0 : waiting.axes & ~axes;
+    if (axes != kZoomAxis) {
+        forgetRecall();
     }
+    bool recallWaits = false;
+    for (PtzRequest& waiting : m_waiting) {
+        const bool isKept = waiting.kind == Kind::recall && m_recall;
+        recallWaits = recallWaits || isKept;
+        if (!isKept) {
+            waiting.axes = waiting.kind == Kind::recall ? 0 : waiting.axes & ~axes;
+        }
+    }
+    m_recallAgain = m_recall && !recallWaits;
     const auto isVoid = [](const PtzRequest& waiting) { return isMotion(waiting) && waiting.axes == 0; };
     m_waiting.erase(std::remove_if(m_waiting.begin(), m_waiting.end(), isVoid), m_waiting.end());
     m_stop |= axes;
@@ -100,8 +121,8 @@ void PtzCommands::end(Clock::time_point now) {
         return;
     }
     m_waiting.clear();
-    const unsigned asked = m_asked && m_asked->kind == Kind::move ? m_asked->axes : 0;
-    m_stop |= m_moving | asked;
+    forgetRecall();
+    m_stop |= m_moving | m_gliding;
     m_endLimit = now + kEndLimit;
 }
 
@@ -129,9 +150,10 @@ std::optional<PtzRequest> PtzCommands::nextStop(Clock::time_point now) {
 PtzRequest PtzCommands::beginPair(unsigned axes) {
     m_again &= ~axes;
     m_moving &= ~axes;
+    m_gliding &= ~axes;
     put(m_speed, axes, {});
-    if (m_asked && isMotion(*m_asked)) {
-        m_overtaken |= m_asked->axes & axes;
+    for (const PtzRequest& asked : m_asked) {
+        m_overtaken |= isMotion(asked) ? asked.axes & axes : 0;
     }
     const PtzRequest stop{.kind = Kind::stop, .axes = axes, .id = ++m_lastId};
     m_halt = PtzRequest{.kind = Kind::halt, .axes = axes, .speed = m_speed, .moving = m_moving, .id = ++m_lastId};
@@ -140,16 +162,30 @@ PtzRequest PtzCommands::beginPair(unsigned axes) {
 }
 
 bool PtzCommands::laneFree() const {
-    return !m_asked && m_pairs.empty() && !m_ended;
+    return m_asked.empty() && m_pairs.empty() && !m_ended;
+}
+
+/// When the move that holds is to be asked again.
+PtzCommands::Clock::time_point PtzCommands::renewal() const {
+    const bool onlyMoves =
+        std::all_of(m_asked.begin(), m_asked.end(), [](const PtzRequest& asked) { return asked.kind == Kind::move; });
+    const bool canBe =
+        m_moving != 0 && m_waiting.empty() && m_pairs.empty() && !m_ended && onlyMoves && m_asked.size() < kMostMoves;
+    return canBe ? m_lastMove + (m_asked.empty() ? kRenewal : kLateRenewal) : Clock::time_point::max();
 }
 
 std::optional<PtzRequest> PtzCommands::nextInOrder(Clock::time_point now) {
+    if (now >= renewal()) {
+        return beginMove({.axes = m_moving, .speed = m_speed}, now);
+    }
     if (!laneFree()) {
         return std::nullopt;
     }
+    if (m_again == 0 && std::exchange(m_recallAgain, false) && now < m_recallEnd) {
+        return beginRecall(*m_recall);
+    }
     if (m_waiting.empty()) {
-        const bool due = m_moving != 0 && now >= m_renewal;
-        return due ? std::optional(beginMove({.axes = m_moving, .speed = m_speed}, now)) : std::nullopt;
+        return std::nullopt;
     }
     if (m_waiting.front().kind == Kind::focus && !std::exchange(m_manualFocus, true)) {
         return begin({.kind = Kind::manualFocus});
@@ -159,28 +195,41 @@ std::optional<PtzRequest> PtzCommands::nextInOrder(Clock::time_point now) {
     if (request.kind == Kind::autoFocus) {
         m_manualFocus = false;
     }
+    if (request.kind == Kind::recall) {
+        m_recallEnd = now + kRecallTime;
+        return beginRecall(request);
+    }
     return request.kind == Kind::move ? beginMove(request, now) : begin(request);
 }
 
 PtzRequest PtzCommands::begin(PtzRequest request) {
     request.id = ++m_lastId;
-    m_asked = request;
+    m_asked.push_back(request);
     return request;
+}
+
+PtzRequest PtzCommands::beginRecall(const PtzRequest& request) {
+    m_gliding = request.axes;
+    return begin(request);
 }
 
 /// A move names every axis in motion: some cameras stop those that it leaves out.
 PtzRequest PtzCommands::beginMove(const PtzRequest& request, Clock::time_point now) {
     m_moving |= request.axes;
+    m_gliding &= ~m_moving;
     put(m_speed, request.axes, request.speed);
     m_again &= ~m_moving;
-    m_renewal = now + kRenewal;
+    m_lastMove = now;
     return begin({.kind = Kind::move, .axes = m_moving, .speed = m_speed});
 }
 
 void PtzCommands::done(std::uint64_t id, bool accepted, Clock::time_point now) {
-    if (m_asked && m_asked->id == id) {
-        m_asked.reset();
-        m_echo |= std::exchange(m_overtaken, 0);
+    const auto asked =
+        std::find_if(m_asked.begin(), m_asked.end(), [id](const PtzRequest& request) { return request.id == id; });
+    if (asked != m_asked.end()) {
+        m_asked.erase(asked);
+        m_echo |= m_overtaken;
+        m_overtaken = m_asked.empty() ? 0 : m_overtaken;
         return;
     }
     const auto it = std::find_if(m_pairs.begin(), m_pairs.end(),
@@ -208,7 +257,8 @@ void PtzCommands::pairDone(const Pair& pair, Clock::time_point now) {
 }
 
 bool PtzCommands::stillWanted(std::uint64_t id) const {
-    return m_asked && m_asked->id == id && m_overtaken == 0 && !m_ended;
+    const auto isIt = [id](const PtzRequest& request) { return request.id == id; };
+    return std::any_of(m_asked.begin(), m_asked.end(), isIt) && m_overtaken == 0 && !m_ended;
 }
 
 PtzCommands::Clock::time_point PtzCommands::nextLook() const {
@@ -216,16 +266,16 @@ PtzCommands::Clock::time_point PtzCommands::nextLook() const {
     if (m_again != 0 && m_pairs.empty()) {
         look = std::min(look, m_stopAgain);
     }
-    return m_moving != 0 && laneFree() ? std::min(look, m_renewal) : look;
+    return std::min(look, renewal());
 }
 
 bool PtzCommands::finished(Clock::time_point now) const {
-    const bool quiet = !m_asked && m_pairs.empty() && (m_stop | m_echo | m_again) == 0;
+    const bool quiet = m_asked.empty() && m_pairs.empty() && (m_stop | m_echo | m_again) == 0;
     return m_ended && (quiet || now >= m_endLimit);
 }
 
 bool PtzCommands::moving() const {
-    return m_moving != 0 || m_asked || !m_pairs.empty() || (m_stop | m_echo | m_again) != 0;
+    return m_moving != 0 || !m_asked.empty() || !m_pairs.empty() || (m_stop | m_echo | m_again) != 0;
 }
 
 } // namespace qivo::runtime

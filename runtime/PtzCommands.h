@@ -44,10 +44,13 @@ struct PtzRequest {
 /// The order in which a camera is asked, without the asking: time comes from the caller, and so do the answers.
 ///
 /// One command is asked after the other, each when the one before it has been answered. A newer speed or focus takes
-/// the place of one that has not been asked yet. A move that holds is asked again and again, since each runs out.
+/// the place of one that has not been asked yet. A move that holds is asked again and again, since each runs out; once
+/// beside one that has not been answered, where that would run out before.
 /// A stop waits for nothing and does away with what was to move before it. It is asked in both ways there are; again
 /// where neither was accepted; and once more when a move that it overtook on the way has been answered, because the
 /// camera may have taken them in the other order. Nothing moves before a stop has been answered or given up.
+/// A stop of the zoom alone does not do away with a recall that no speed followed: it comes from a pointer that passes
+/// a button, and would leave the camera with the zoom of another place. The recall is asked once more after it.
 ///
 /// Thread: one at a time.
 class PtzCommands {
@@ -58,6 +61,13 @@ class PtzCommands {
     static constexpr std::chrono::seconds kRunOut{1};
     /// When a move that holds is asked again.
     static constexpr std::chrono::milliseconds kRenewal{400};
+    /// The same where the camera has not answered yet. Later, because a camera that does one thing after the other has
+    /// to do this one, too, before it comes to a stop.
+    static constexpr std::chrono::milliseconds kLateRenewal{700};
+    /// Moves that are asked at a time.
+    static constexpr std::size_t kMostMoves = 2;
+    /// How long after it was asked a recall may have to be asked again; by then cameras have arrived.
+    static constexpr std::chrono::seconds kRecallTime{20};
     /// The pause before a stop is asked again.
     static constexpr std::chrono::milliseconds kStopPause{200};
     /// How often a stop is asked that nothing accepts.
@@ -77,7 +87,7 @@ class PtzCommands {
     bool store(int preset);
     bool recall(int preset, float speed);
 
-    /// Nothing is accepted any more; what moves is stopped.
+    /// Nothing is accepted any more; what moves is stopped, and what may be on its way to a preset.
     void end(Clock::time_point now);
 
     /// What to ask now; to be called until there is nothing.
@@ -106,27 +116,35 @@ class PtzCommands {
     bool speeds(unsigned axes, const PtzSpeed& speed);
     bool enqueue(const PtzRequest& request);
     void stop(unsigned axes);
+    void forgetRecall();
     std::optional<PtzRequest> nextStop(Clock::time_point now);
     std::optional<PtzRequest> nextInOrder(Clock::time_point now);
     PtzRequest beginPair(unsigned axes);
     PtzRequest begin(PtzRequest request);
+    PtzRequest beginRecall(const PtzRequest& request);
     PtzRequest beginMove(const PtzRequest& request, Clock::time_point now);
     void pairDone(const Pair& pair, Clock::time_point now);
     bool laneFree() const;
+    Clock::time_point renewal() const;
 
     std::deque<PtzRequest> m_waiting;
-    std::optional<PtzRequest> m_asked; ///< the one in order that has not been answered
+    std::vector<PtzRequest> m_asked; ///< in order and not answered yet; more than one only of moves
     std::uint64_t m_lastId = 0;
 
-    PtzSpeed m_speed{};    ///< as last asked
-    unsigned m_moving = 0; ///< axes that were asked to move and not to stop
-    Clock::time_point m_renewal{};
+    PtzSpeed m_speed{};     ///< as last asked
+    unsigned m_moving = 0;  ///< axes that were asked to move and not to stop
+    unsigned m_gliding = 0; ///< axes that a recall has set off and nothing has moved or stopped since
+    Clock::time_point m_lastMove{};
     bool m_manualFocus = false;
+
+    std::optional<PtzRequest> m_recall; ///< the newest, until a speed or a stop of more than the zoom follows
+    bool m_recallAgain = false;         ///< it was asked and then the zoom was stopped
+    Clock::time_point m_recallEnd{};
 
     unsigned m_stop = 0;      ///< axes to be stopped at once
     unsigned m_echo = 0;      ///< to be stopped once more as soon as no stop is under way
     unsigned m_again = 0;     ///< to be stopped once more at m_stopAgain
-    unsigned m_overtaken = 0; ///< stopped while m_asked may still make them move
+    unsigned m_overtaken = 0; ///< stopped while one of m_asked may still make them move
     Clock::time_point m_stopAgain{};
     int m_tries = 0;
     std::optional<PtzRequest> m_halt; ///< second half of a stop whose first has just been asked

@@ -299,9 +299,129 @@ TEST_F(SteeringQueue, ARecallThatWasStoppedIsNoLongerWanted) {
     ASSERT_EQ(kinds(), std::vector{Kind::recall});
     const auto recall = m_last;
     EXPECT_TRUE(m_commands.stillWanted(recall[0].id));
-    EXPECT_TRUE(m_commands.zoom(0));
+    EXPECT_TRUE(m_commands.move(0, 0));
     ASSERT_EQ(kinds(), kStop);
     EXPECT_FALSE(m_commands.stillWanted(recall[0].id));
+    answer();
+    m_commands.done(recall[0].id, false, m_now);
+    EXPECT_EQ(kinds(), kStop) << "the camera may have taken it all the same";
+    answer();
+    m_now += 1h;
+    EXPECT_EQ(asked().size(), 0U);
+}
+
+/// As a panel does whose pointer passes a button.
+TEST_F(SteeringQueue, AStopOfTheZoomAloneLeavesARecallThatWaits) {
+    EXPECT_TRUE(m_commands.store(1));
+    asked();
+    EXPECT_TRUE(m_commands.recall(2, 1));
+    EXPECT_TRUE(m_commands.zoom(0));
+    ASSERT_EQ(kinds(), kStop);
+    answer();
+    m_commands.done(1, true, m_now);
+    ASSERT_EQ(kinds(), std::vector{Kind::recall});
+    EXPECT_EQ(m_last[0].preset, 2);
+    answer();
+    EXPECT_EQ(asked().size(), 0U) << "and not twice";
+}
+
+TEST_F(SteeringQueue, AStopOfTheZoomAloneIsFollowedByTheRecallThatItBroke) {
+    EXPECT_TRUE(m_commands.recall(2, 0.25F));
+    ASSERT_EQ(kinds(), std::vector{Kind::recall});
+    const auto recall = m_last;
+    EXPECT_TRUE(m_commands.zoom(0));
+    ASSERT_EQ(kinds(), kStop) << "at once";
+    answer();
+    m_commands.done(recall[0].id, true, m_now);
+    ASSERT_EQ(kinds(), kStop) << "the camera may have taken the first before the recall";
+    answer();
+    ASSERT_EQ(kinds(), std::vector{Kind::recall});
+    EXPECT_EQ(m_last[0].preset, 2);
+    EXPECT_EQ(m_last[0].value, 0.25F);
+    answer();
+    EXPECT_TRUE(m_commands.zoom(0));
+    ASSERT_EQ(kinds(), kStop);
+    answer(false);
+    EXPECT_EQ(asked().size(), 0U) << "the stop comes first";
+    m_now += PtzCommands::kStopPause;
+    ASSERT_EQ(kinds(), kStop);
+    answer();
+    EXPECT_EQ(kinds(), std::vector{Kind::recall});
+    answer();
+    EXPECT_EQ(asked().size(), 0U);
+}
+
+TEST_F(SteeringQueue, ARecallIsNotAskedAgainAfterASpeedOrAnotherStopOrMuchLater) {
+    const auto recalled = [this] {
+        EXPECT_TRUE(m_commands.recall(2, 1));
+        EXPECT_EQ(kinds(), std::vector{Kind::recall});
+        answer();
+    };
+    const auto stopped = [this] {
+        EXPECT_EQ(kinds(), kStop);
+        answer();
+    };
+    recalled();
+    EXPECT_TRUE(m_commands.zoom(0.1F));
+    EXPECT_EQ(kinds(), std::vector{Kind::move});
+    answer();
+    EXPECT_TRUE(m_commands.zoom(0));
+    stopped();
+    EXPECT_EQ(asked().size(), 0U) << "somebody zooms";
+
+    recalled();
+    EXPECT_TRUE(m_commands.zoom(0));
+    EXPECT_TRUE(m_commands.move(0, 0));
+    stopped();
+    EXPECT_EQ(asked().size(), 0U) << "both are to stand";
+
+    recalled();
+    m_now += PtzCommands::kRecallTime;
+    EXPECT_TRUE(m_commands.zoom(0));
+    stopped();
+    EXPECT_EQ(asked().size(), 0U) << "it has long arrived";
+}
+
+/// Some cameras answer a move only when it has been done, and stop by themselves meanwhile.
+TEST_F(SteeringQueue, AMoveThatHoldsIsRenewedBesideOneThatIsNotAnswered) {
+    EXPECT_TRUE(m_commands.move(0.5F, 0));
+    ASSERT_EQ(kinds(), std::vector{Kind::move});
+    const auto first = m_last;
+    EXPECT_EQ(m_commands.nextLook(), m_now + PtzCommands::kLateRenewal);
+    m_now += PtzCommands::kLateRenewal - 1ms;
+    EXPECT_EQ(asked().size(), 0U);
+    m_now += 1ms;
+    ASSERT_EQ(kinds(), std::vector{Kind::move});
+    const auto second = m_last;
+    EXPECT_EQ(second[0].speed.pan, 0.5F);
+    EXPECT_LT(PtzCommands::kLateRenewal, PtzCommands::kRunOut);
+    m_now += 1s;
+    EXPECT_EQ(asked().size(), 0U) << "no more than two, since a stop may have to wait for them";
+    EXPECT_TRUE(m_commands.move(-0.5F, 0));
+    m_commands.done(first[0].id, true, m_now);
+    EXPECT_EQ(asked().size(), 0U) << "the other may be taken after a newer one";
+    m_commands.done(second[0].id, true, m_now);
+    ASSERT_EQ(kinds(), std::vector{Kind::move});
+    EXPECT_EQ(m_last[0].speed.pan, -0.5F);
+}
+
+TEST_F(SteeringQueue, AStopIsRepeatedUntilBothMovesThatItOvertookAreAnswered) {
+    EXPECT_TRUE(m_commands.move(0.5F, 0));
+    const auto first = asked();
+    m_now += PtzCommands::kLateRenewal;
+    const auto second = asked();
+    ASSERT_EQ(second.size(), 1U);
+    EXPECT_TRUE(m_commands.move(0, 0));
+    ASSERT_EQ(kinds(), kStop);
+    answer();
+    for (const PtzRequest& move : {first[0], second[0]}) {
+        m_commands.done(move.id, true, m_now);
+        ASSERT_EQ(kinds(), kStop);
+        answer();
+    }
+    m_now += 1h;
+    EXPECT_EQ(asked().size(), 0U);
+    EXPECT_FALSE(m_commands.moving());
 }
 
 TEST_F(SteeringQueue, TheEndStopsWhatMoves) {
@@ -339,9 +459,49 @@ TEST_F(SteeringQueue, TheEndComesInTimeWhateverTheCameraDoes) {
     EXPECT_TRUE(m_commands.finished(m_now));
 }
 
+TEST_F(SteeringQueue, TheEndStopsARecall) {
+    EXPECT_TRUE(m_commands.recall(1, 1));
+    EXPECT_EQ(kinds(), std::vector{Kind::recall});
+    answer();
+    EXPECT_TRUE(m_commands.zoom(0.1F));
+    EXPECT_EQ(kinds(), std::vector{Kind::move});
+    answer();
+    EXPECT_TRUE(m_commands.zoom(0));
+    EXPECT_EQ(kinds(), kStop);
+    answer();
+    m_commands.end(m_now);
+    ASSERT_EQ(kinds(), kStop);
+    EXPECT_EQ(m_last[0].axes, runtime::kPanTiltAxes) << "the zoom stands";
+    answer();
+    EXPECT_TRUE(m_commands.finished(m_now));
+}
+
+TEST_F(SteeringQueue, TheEndStopsARecallThatHasNotBeenAnswered) {
+    EXPECT_TRUE(m_commands.recall(1, 1));
+    const auto recall = asked();
+    m_commands.end(m_now);
+    EXPECT_FALSE(m_commands.stillWanted(recall[0].id));
+    ASSERT_EQ(kinds(), kStop);
+    EXPECT_EQ(m_last[0].axes, runtime::kPanTiltAxes | runtime::kZoomAxis);
+    answer();
+    m_commands.done(recall[0].id, true, m_now);
+    ASSERT_EQ(kinds(), kStop);
+    answer();
+    EXPECT_TRUE(m_commands.finished(m_now));
+}
+
 TEST_F(SteeringQueue, TheEndLeavesACameraThatStandsAlone) {
+    EXPECT_TRUE(m_commands.store(1));
+    kinds();
+    answer();
     EXPECT_TRUE(m_commands.recall(1, 1));
     kinds();
+    answer();
+    EXPECT_TRUE(m_commands.move(0, 0));
+    EXPECT_EQ(kinds(), kStop);
+    answer();
+    EXPECT_TRUE(m_commands.zoom(0));
+    EXPECT_EQ(kinds(), kStop);
     answer();
     m_commands.end(m_now);
     EXPECT_EQ(asked().size(), 0U);
