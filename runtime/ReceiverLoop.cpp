@@ -36,8 +36,15 @@ void ReceiverLoop::stop() {
     m_mailbox->close();
     m_wakeup->notify();
     const std::lock_guard guard(m_mutex);
-    if (m_steering) {
-        m_steering->end();
+    endSteering();
+}
+
+/// With the lock held.
+void ReceiverLoop::endSteering() {
+    for (auto* steering : {&m_steering, &m_successor}) {
+        if (*steering) {
+            (*steering)->end();
+        }
     }
 }
 
@@ -48,6 +55,10 @@ std::string ReceiverLoop::webControl() const {
 
 std::shared_ptr<Steering> ReceiverLoop::steering() const {
     const std::lock_guard guard(m_mutex);
+    if (m_successor && m_successor->isSupported()) {
+        m_steering->end();
+        m_steering = std::exchange(m_successor, nullptr);
+    }
     return m_steering && m_steering->isSupported() ? m_steering : nullptr;
 }
 
@@ -108,19 +119,27 @@ void ReceiverLoop::refreshAnnouncement() {
 
 /// Looks for the camera behind the source, anew where the announcement leads elsewhere or where none was found. The
 /// sound of a source is received beside its picture, which is enough to steer by.
-void ReceiverLoop::steer() {
+///
+/// `anew`: the device may have restarted, and what was asked once may be out of date. It is asked again beside what
+/// steers it meanwhile.
+void ReceiverLoop::steer(bool anew) {
     if (m_request.bandwidth == QIVOlib_recv_bandwidth_audio_only) {
         return;
     }
     auto target = steeringTarget(m_request, m_announcement, m_shown);
     const std::lock_guard guard(m_mutex);
-    if (m_stopped || (target && m_steering && !m_steering->isOver() && m_steering->target() == *target)) {
+    if (m_stopped) {
         return;
     }
-    if (m_steering) {
-        m_steering->end();
-        m_steering.reset();
+    if (target && m_steering && !m_steering->isOver() && m_steering->target() == *target) {
+        if (anew && m_steering->isSupported() && (!m_successor || m_successor->isOver())) {
+            m_successor = Steering::start(std::move(*target), [] {});
+        }
+        return;
     }
+    endSteering();
+    m_steering.reset();
+    m_successor.reset();
     if (target) {
         m_steering = Steering::start(std::move(*target), [mailbox = m_mailbox] { mailbox->raiseStatus(); });
     }
@@ -164,8 +183,7 @@ ReceiverLoop::Outcome ReceiverLoop::watch(const RtspSession& session, const std:
                 m_environment.transports->remember(sourceKey(url));
             }
             m_mailbox->raiseStatus();
-            m_shown = true;
-            steer();
+            steer(std::exchange(m_shown, true));
         }
         if (auto outcome = judge(session, began, url)) {
             return *outcome;

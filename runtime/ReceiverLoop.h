@@ -65,7 +65,8 @@ class ReceiverLoop {
 
     void refreshAnnouncement();
     std::string target(bool first) const;
-    void steer();
+    void endSteering();
+    void steer(bool anew = false);
     Outcome attempt(const std::string& url, bool tcp);
     Outcome watch(const RtspSession& session, const std::string& url, bool tcp);
     void end(std::shared_ptr<RtspSession> session);
@@ -98,7 +99,8 @@ class ReceiverLoop {
     mutable std::mutex m_mutex; // protects the rest
     std::string m_web;
     std::string m_onvif;
-    std::shared_ptr<Steering> m_steering;
+    mutable std::shared_ptr<Steering> m_steering;
+    mutable std::shared_ptr<Steering> m_successor; ///< asks the same device anew; takes over once it has its answers
 };
 
 } // namespace qivo::runtime
