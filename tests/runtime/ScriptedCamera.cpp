@@ -90,10 +90,10 @@ std::string ScriptedCamera::envelope(const std::string& body) {
            body + "</env:Body></env:Envelope>";
 }
 
-std::string ScriptedCamera::fault(const std::string& reason) {
-    return envelope("<env:Fault><env:Code><env:Value>env:Receiver</env:Value></env:Code><env:Reason><env:Text "
-                    "xml:lang=\"en\">" +
-                    reason + "</env:Text></env:Reason></env:Fault>");
+std::string ScriptedCamera::fault(const std::string& reason, const std::string& code) {
+    return envelope("<env:Fault><env:Code><env:Value>env:Sender</env:Value><env:Subcode><env:Value>" + code +
+                    "</env:Value></env:Subcode></env:Code><env:Reason><env:Text xml:lang=\"en\">" + reason +
+                    "</env:Text></env:Reason></env:Fault>");
 }
 
 void ScriptedCamera::serve(Connection& connection) {
@@ -165,7 +165,7 @@ std::string ScriptedCamera::answerTo(const CameraCall& call) {
         return response("trt:GetProfiles", profiles());
     }
     if (call.operation == "GetStreamUri") {
-        const bool dome = call.after("ProfileToken>") == "dome";
+        const bool dome = call.after("ProfileToken>") != "fixed";
         return response("trt:GetStreamUri", "<trt:MediaUri><tt:Uri>rtsp://10.0.0.9:554" +
                                                 (dome ? streamPath : "/fixed") + "</tt:Uri></trt:MediaUri>");
     }
@@ -190,11 +190,7 @@ std::string ScriptedCamera::answerTo(const CameraCall& call) {
     } else if (call.operation == "SetPreset") {
         return store(call);
     } else if (call.operation == "GotoPreset") {
-        const std::lock_guard guard(m_mutex);
-        m_recalled = call.after("PresetToken>");
-        if (m_presets.count(m_recalled) == 0) {
-            return fault("no such preset");
-        }
+        return recall(call);
     } else if (call.operation != "SetImagingSettings" && call.operation != "Move") {
         return fault("no such operation");
     }
@@ -207,10 +203,12 @@ void ScriptedCamera::move(const CameraCall& call) {
     if (!pan.empty()) {
         m_speed.pan = numberOf(pan);
         m_speed.tilt = numberOf(call.after("y=\""));
+        m_panTiltGlides = false;
     }
     const std::string zoom = call.after("Zoom x=\"");
     if (!zoom.empty()) {
         m_speed.zoom = numberOf(zoom);
+        m_zoomGlides = false;
     }
     m_runOut = Clock::now() + std::chrono::seconds(call.after("Timeout>") == "PT1S" ? 1 : 60);
 }
@@ -218,16 +216,65 @@ void ScriptedCamera::move(const CameraCall& call) {
 void ScriptedCamera::stop(bool panTilt, bool zoom) {
     const std::lock_guard guard(m_mutex);
     m_speed = {panTilt ? 0 : m_speed.pan, panTilt ? 0 : m_speed.tilt, zoom ? 0 : m_speed.zoom};
+    m_panTiltGlides = m_panTiltGlides && !panTilt;
+    m_zoomGlides = m_zoomGlides && !zoom;
 }
 
 std::string ScriptedCamera::store(const CameraCall& call) {
     std::string token = call.after("PresetToken>");
+    const std::string name = call.after("PresetName>");
     const std::lock_guard guard(m_mutex);
+    const bool isTaken = std::any_of(m_presets.begin(), m_presets.end(), [&](const auto& preset) {
+        return preset.first != token && preset.second == name;
+    });
+    if (isTaken) {
+        return fault("another preset has this name", "ter:PresetExist");
+    }
+    if (!token.empty() && m_presets.count(token) == 0) {
+        return fault("no such preset", "ter:NoToken");
+    }
     if (token.empty()) {
         token = "slot" + std::string(1, static_cast<char>('A' + m_presets.size()));
     }
-    m_presets[token] = call.after("PresetName>");
+    m_presets[token] = name;
     return response("tptz:SetPreset", "<tptz:PresetToken>" + token + "</tptz:PresetToken>");
+}
+
+std::string ScriptedCamera::recall(const CameraCall& call) {
+    const std::lock_guard guard(m_mutex);
+    m_recalled = call.after("PresetToken>");
+    if (m_presets.count(m_recalled) == 0) {
+        return fault("no such preset", "ter:NoToken");
+    }
+    m_panTiltGlides = true;
+    m_zoomGlides = true;
+    return response("tptz:GotoPreset");
+}
+
+bool ScriptedCamera::glides() const {
+    const std::lock_guard guard(m_mutex);
+    return m_panTiltGlides || m_zoomGlides;
+}
+
+void ScriptedCamera::setPreset(const std::string& token, const std::string& name) {
+    const std::lock_guard guard(m_mutex);
+    m_presets[token] = name;
+}
+
+void ScriptedCamera::removePreset(const std::string& token) {
+    const std::lock_guard guard(m_mutex);
+    m_presets.erase(token);
+}
+
+std::vector<std::string> ScriptedCamera::presetsNamed(const std::string& name) const {
+    const std::lock_guard guard(m_mutex);
+    std::vector<std::string> tokens;
+    for (const auto& preset : m_presets) {
+        if (preset.second == name) {
+            tokens.push_back(preset.first);
+        }
+    }
+    return tokens;
 }
 
 ScriptedCamera::Speed ScriptedCamera::speed() const {

@@ -2,6 +2,7 @@
 
 #include "tests/runtime/RawServer.h"
 
+#include <atomic>
 #include <chrono>
 #include <functional>
 #include <map>
@@ -50,7 +51,7 @@ class ScriptedCamera {
     /// Answers with a document; complete with header, fit to be sent.
     static std::string http(const std::string& xml, const std::string& status = "200 OK",
                             const std::string& lines = "");
-    static std::string fault(const std::string& reason);
+    static std::string fault(const std::string& reason, const std::string& code = "ter:Action");
     static std::string envelope(const std::string& body);
     /// What the camera answers by itself; it does what it is asked.
     std::string answerTo(const CameraCall& call);
@@ -61,11 +62,18 @@ class ScriptedCamera {
     bool namesPresets = true;
     std::string streamPath = "/live"; ///< of the profile that can be steered
     std::string servicesAt;           ///< scheme, host and port of the services; empty: where it was asked
-    std::chrono::seconds clockAhead{0};
+    std::atomic<std::chrono::seconds> clockAhead{std::chrono::seconds(0)};
 
     /// Speeds by which it moves now.
     Speed speed() const;
     bool moves() const { return speed() != Speed{}; }
+    /// Whether pan and tilt, or the zoom, are on their way to a preset, where they never arrive.
+    bool glides() const;
+    /// What another client does: gives a preset a name, new or not, or takes it away.
+    void setPreset(const std::string& token, const std::string& name);
+    void removePreset(const std::string& token);
+    /// The tokens of the presets of that name.
+    std::vector<std::string> presetsNamed(const std::string& name) const;
     std::vector<CameraCall> calls(const std::string& operation = "") const;
     int count(const std::string& operation) const { return static_cast<int>(calls(operation).size()); }
     std::string lastRecalled() const;
@@ -83,6 +91,7 @@ class ScriptedCamera {
     void move(const CameraCall& call);
     void stop(bool panTilt, bool zoom);
     std::string store(const CameraCall& call);
+    std::string recall(const CameraCall& call);
 
     Quirk m_quirk;
     mutable std::mutex m_mutex; // protects the rest
@@ -91,6 +100,8 @@ class ScriptedCamera {
     Clock::time_point m_runOut{};
     std::map<std::string, std::string> m_presets; // token, name
     std::string m_recalled;
+    bool m_panTiltGlides = false;
+    bool m_zoomGlides = false;
 
     RawServer m_server; // ends first: its threads use what is above
 };

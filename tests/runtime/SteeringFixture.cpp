@@ -1,13 +1,31 @@
 #include "tests/runtime/SteeringFixture.h"
 
 #include "runtime/BackgroundThreads.h"
+#include "runtime/OnvifLogin.h"
 
+#include <glib.h>
 #include <thread>
 
 namespace qivo::test {
 
 using runtime::Steering;
 using runtime::SteeringTarget;
+
+bool provesToken(const CameraCall& call, const ScriptedCamera& camera) {
+    const std::chrono::seconds ahead = camera.clockAhead;
+    gsize length = 0;
+    guchar* bytes = g_base64_decode(call.after("#Base64Binary\">").c_str(), &length);
+    const std::string nonce(reinterpret_cast<const char*>(bytes), length);
+    g_free(bytes);
+    const std::string created = call.after("Created>");
+    bool fresh = false;
+    for (int second = -10; second <= 10; ++second) {
+        fresh = fresh ||
+                created == runtime::timeText(std::chrono::system_clock::now() + ahead + std::chrono::seconds(second));
+    }
+    return fresh && call.after("Username>") == "ann" &&
+           call.after("#PasswordDigest\">") == runtime::passwordDigest(nonce, created, "secret");
+}
 
 SteeringCameraTest::~SteeringCameraTest() {
     for (const auto& one : m_steerings) {

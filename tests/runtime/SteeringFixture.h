@@ -19,6 +19,9 @@ using Clock = std::chrono::steady_clock;
 /// From the call of a stop to its arrival at the camera.
 inline constexpr std::chrono::milliseconds kStopOnWire = 50ms * kSanitizerPatience;
 
+/// Whether the request proves the login ann:secret by WS-Security, made within ten seconds by the camera's clock.
+bool provesToken(const CameraCall& call, const ScriptedCamera& camera);
+
 /// Steers scripted cameras.
 class SteeringCameraTest : public testing::Test {
   protected:

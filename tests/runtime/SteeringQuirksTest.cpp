@@ -1,12 +1,14 @@
 // Cameras as they are: each of the table is steered, or refused, without harm.
 
-#include "runtime/OnvifLogin.h"
 #include "tests/runtime/SteeringFixture.h"
 
 #include <glib.h>
 #include <gtest/gtest.h>
 
+#include <memory>
+#include <mutex>
 #include <regex>
+#include <set>
 #include <string>
 
 namespace qivo::test {
@@ -64,24 +66,8 @@ bool digestOnly(Camera&, Connection& connection, const CameraCall& call) {
                                         "WWW-Authenticate: Digest realm=\"camera\", nonce=\"abc\", qop=\"auth\"\r\n"));
 }
 
-/// Whether the request proves the login ann:secret by WS-Security, made within ten seconds by the camera's clock.
-bool provesToken(const CameraCall& call, std::chrono::seconds ahead) {
-    gsize length = 0;
-    guchar* bytes = g_base64_decode(call.after("#Base64Binary\">").c_str(), &length);
-    const std::string nonce(reinterpret_cast<const char*>(bytes), length);
-    g_free(bytes);
-    const std::string created = call.after("Created>");
-    bool fresh = false;
-    for (int second = -10; second <= 10; ++second) {
-        fresh = fresh ||
-                created == runtime::timeText(std::chrono::system_clock::now() + ahead + std::chrono::seconds(second));
-    }
-    return fresh && call.after("Username>") == "ann" &&
-           call.after("#PasswordDigest\">") == runtime::passwordDigest(nonce, created, "secret");
-}
-
 bool aDayAhead(Camera& camera, Connection& connection, const CameraCall& call) {
-    return call.operation != "GetSystemDateAndTime" && !provesToken(call, camera.clockAhead) &&
+    return call.operation != "GetSystemDateAndTime" && !provesToken(call, camera) &&
            connection.send(Camera::http(Camera::fault("not authorized"), "400 Bad Request"));
 }
 
@@ -123,7 +109,7 @@ bool dead(Camera&, Connection& connection, const CameraCall&) {
     return true;
 }
 
-/// Takes a second for every byte, for ever.
+/// Takes 50 ms for every byte, for ever, and comes to no end of the header.
 bool drip(Camera&, Connection& connection, const CameraCall&) {
     while (connection.send("H")) {
         std::this_thread::sleep_for(50ms);
@@ -139,11 +125,30 @@ bool hangsUp(Camera&, Connection& connection, const CameraCall& call) {
     return true;
 }
 
-/// The first answer to each command is lost with its connection.
+/// Answers as servers of HTTP 1.0 do, whose answers end with the connection.
 bool closesAfterEach(Camera& camera, Connection& connection, const CameraCall& call) {
     connection.send("HTTP/1.0 200 OK\r\nConnection: close\r\n\r\n" + camera.answerTo(call));
     connection.close();
     return true;
+}
+
+/// Does what it is told and ends the connection in place of an answer, the first time for each command.
+Camera::Quirk losingAnswers() {
+    return [lost = std::make_shared<std::set<std::string>>(),
+            mutex = std::make_shared<std::mutex>()](Camera& camera, Connection& connection, const CameraCall& call) {
+        if (call.operation.find("Get") == 0) {
+            return false;
+        }
+        {
+            const std::lock_guard guard(*mutex);
+            if (!lost->insert(call.operation).second) {
+                return false;
+            }
+        }
+        camera.answerTo(call);
+        connection.close();
+        return true;
+    };
 }
 
 std::string withoutPrefixes(std::string xml) {
@@ -228,6 +233,7 @@ std::vector<Quirk> quirks() {
         {.name = "Slow", .quirk = slow},
         {.name = "Chunked", .prepare = [](Camera& camera) { camera.chunked = true; }},
         {.name = "ClosesAfterEach", .quirk = closesAfterEach},
+        {.name = "LosesAnswers", .quirk = losingAnswers()},
         {.name = "OnlyServices", .quirk = onlyServices},
         {.name = "Redirecting", .quirk = redirecting},
         {.name = "RedirectingAway", .steered = false, .quirk = redirectingAway, .check = neverElsewhere},

@@ -6,7 +6,10 @@
 
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <csignal>
+#include <memory>
+#include <regex>
 #include <string>
 
 namespace qivo::test {
@@ -107,6 +110,36 @@ TEST_F(SteeringReceiverTest, AnAnnouncementThatLeadsElsewhereStopsTheCameraThatW
     EXPECT_FALSE(first.moves());
 }
 
+/// It was switched off meanwhile, and what it told of itself may be out of date.
+TEST_F(SteeringReceiverTest, ACameraIsAskedAnewWhenItsSourceHasComeBack) {
+    auto restarted = std::make_shared<std::atomic<bool>>(false);
+    ScriptedCamera camera([restarted](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
+        if (!*restarted) {
+            return false;
+        }
+        const bool isOld = call.body.find("ProfileToken>dome<") != std::string::npos;
+        const std::string answer = isOld ? self.fault("no such profile", "ter:NoProfile") : self.answerTo(call);
+        return connection.send(self.http(std::regex_replace(answer, std::regex("token=\"dome\""), "token=\"dome2\"")));
+    });
+    const auto receiver = receive("", "STUDIO (Dome)");
+    announce(camera.url());
+    ASSERT_TRUE(offersSteering(*receiver));
+    ASSERT_TRUE(nextPicture(*receiver));
+    const int connections = m_source.connections();
+    *restarted = true;
+    m_source.setSilent(true);
+    ASSERT_TRUE(camera.until([&] { return m_source.connections() > connections; }));
+    m_source.setSilent(false);
+    ASSERT_TRUE(nextPicture(*receiver));
+    EXPECT_TRUE(receiver->steering()) << "it was never without";
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") == 2; }));
+    EXPECT_TRUE(camera.until([&] {
+        const auto steering = receiver->steering();
+        return steering && steering->panTilt(0.5F, 0) && camera.until([&] { return camera.moves(); }, 200ms);
+    }));
+    EXPECT_EQ(camera.calls("ContinuousMove").back().after("ProfileToken>"), "dome2");
+}
+
 TEST_F(SteeringReceiverTest, SoundAloneIsNotSteered) {
     const ScriptedCamera camera;
     const auto receiver = receive("", "STUDIO (Dome)", QIVOlib_recv_bandwidth_audio_only);
@@ -158,6 +191,25 @@ TEST_P(SteeringEnds, LeaveTheCameraStanding) {
     ASSERT_TRUE(camera.until([&] { return !camera.moves(); }, 3s * kSanitizerPatience));
     EXPECT_LT(Clock::now() - ended, 1s + 50ms * kSanitizerPatience);
 }
+
+class SteeringRecallEnds : public testing::TestWithParam<const char*> {};
+
+TEST_P(SteeringRecallEnds, LeaveTheCameraStanding) {
+    ScriptedCamera camera(nullptr, kUsualPort);
+    camera.setPreset("7", "QIVO 7");
+    const RtspServer source{{.launch = h264(kPicture)}};
+    const auto child = Process::start({STEER_CHILD, source.url(), GetParam(), "7"});
+    ASSERT_TRUE(child);
+    ASSERT_TRUE(child->waitForOutput("turning")) << child->output() << child->errors();
+    ASSERT_TRUE(camera.until([&] { return camera.glides(); }));
+    ASSERT_TRUE(child->waitForOutput("ending"));
+    const auto ended = Clock::now();
+    ASSERT_TRUE(camera.until([&] { return !camera.glides(); }, 3s * kSanitizerPatience));
+    EXPECT_LT(Clock::now() - ended, 1s + 50ms * kSanitizerPatience);
+}
+
+INSTANTIATE_TEST_SUITE_P(Process, SteeringRecallEnds, testing::Values("receiver", "library", "exit"),
+                         [](const auto& one) { return std::string(one.param); });
 
 INSTANTIATE_TEST_SUITE_P(
     Process, SteeringEnds,

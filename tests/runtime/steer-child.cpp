@@ -1,4 +1,5 @@
-// steer-child URL END: begins to turn the camera behind the source, says so and ends as it is told:
+// steer-child URL END [PRESET]: begins to turn the camera behind the source, or sends it to a preset, says so and ends
+// as it is told:
 //   hold      not by itself
 //   receiver  destroys the receiver and lives on
 //   library   destroys the library and lives on
@@ -36,7 +37,7 @@ bool waitForCamera(QIVOlib_recv_instance_t receiver) {
 } // namespace
 
 int main(int argc, char** argv) {
-    if (argc != 3 || !QIVOlib_initialize()) {
+    if (argc < 3 || argc > 4 || !QIVOlib_initialize()) {
         return 2;
     }
     const std::string end = argv[2];
@@ -45,7 +46,10 @@ int main(int argc, char** argv) {
     settings.color_format = QIVOlib_recv_color_format_rgba;
     settings.bandwidth = QIVOlib_recv_bandwidth_highest;
     QIVOlib_recv_instance_t const receiver = QIVOlib_recv_create_v3(&settings);
-    if (!waitForCamera(receiver) || !QIVOlib_recv_ptz_pan_tilt_speed(receiver, 0.1F, 0)) {
+    const bool obeys =
+        waitForCamera(receiver) && (argc == 4 ? QIVOlib_recv_ptz_recall_preset(receiver, std::atoi(argv[3]), 0.25F)
+                                              : QIVOlib_recv_ptz_pan_tilt_speed(receiver, 0.1F, 0));
+    if (!obeys) {
         say("no camera");
         return 1;
     }
