@@ -266,9 +266,14 @@ TEST_F(CameraTest, aNewPresetTakesTheNumberThatItIsCalledOrTheLowestFree) {
     EXPECT_EQ(m_camera.freePreset("7"), "7");
     EXPECT_EQ(m_camera.freePreset("Door"), "1");
     EXPECT_EQ(m_camera.freePreset("65"), "1");
+    EXPECT_EQ(m_camera.freePreset("QIVO 3"), "3");
+    EXPECT_EQ(m_camera.freePreset("QIVO 03"), "1");
+    EXPECT_EQ(m_camera.freePreset("QIVO3"), "1");
+    EXPECT_EQ(m_camera.freePreset("QIVO 255"), "1");
     ASSERT_TRUE(m_camera.storePreset("1"));
     ASSERT_TRUE(m_camera.storePreset("7"));
     EXPECT_EQ(m_camera.freePreset("7"), "2");
+    EXPECT_EQ(m_camera.freePreset("QIVO 7"), "2");
     for (int number = 1; number <= Camera::maximumPresets; ++number) {
         ASSERT_TRUE(m_camera.storePreset(std::to_string(number)));
     }

@@ -249,8 +249,9 @@ bool Camera::storePreset(const std::string& token, const std::string& name) {
 
 std::string Camera::freePreset(const std::string& name) const {
     const std::lock_guard lock(m_mutex);
-    if (const int wanted = presetNumber(name); wanted != 0 && m_presets.count(wanted) == 0) {
-        return name;
+    const std::string last = name.substr(name.rfind(' ') + 1); // all of it where there is no blank
+    if (const int wanted = presetNumber(last); wanted != 0 && m_presets.count(wanted) == 0) {
+        return last;
     }
     for (int number = 1; number <= maximumPresets; ++number) {
         if (m_presets.count(number) == 0) {

@@ -116,8 +116,8 @@ class Camera {
      *  another's. */
     bool storePreset(const std::string& token, const std::string& name = {});
 
-    /** The token for a new preset: the name where that is a free number (people call presets by number), else the
-     *  lowest free. Empty if all are taken. */
+    /** The token for a new preset: the number that the name is, or ends with after a blank ("QIVO 3"), where that is
+     *  free, since people call presets by number; else the lowest free. Empty if all are taken. */
     [[nodiscard]] std::string freePreset(const std::string& name = {}) const;
 
     /** Goes to a preset at a speed from 0 to 1, as moveTo() does. False: there is none, or no such speed. */
