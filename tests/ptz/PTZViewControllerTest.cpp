@@ -1,4 +1,7 @@
+#include "platform/PointerState.h"
 #include "tests/ptz/PanelFixture.h"
+
+#include <QGuiApplication>
 
 namespace qivo {
 namespace {
@@ -112,6 +115,23 @@ TEST_F(PTZViewControllerTest, ActionThatArrivesWhileNoMouseButtonIsDownStops) {
     EXPECT_THAT(sent(), ElementsAre("recv_ptz_zoom_speed(r1, 0)", "recv_ptz_zoom_speed(r1, 0)",
                                     "recv_ptz_pan_tilt_speed(r1, 0, 0)", "recv_ptz_pan_tilt_speed(r1, 0, 0)",
                                     "recv_ptz_pan_tilt_speed(r1, 0, 0)", "recv_ptz_pan_tilt_speed(r1, 0, 0)"));
+}
+
+TEST_F(PTZViewControllerTest, ActionGoesByTheMouseAsItIsAndNotByTheEvents) {
+    auto& controller = panel->controller();
+    screen->press(1, 1); // where no window is told of it
+    EXPECT_EQ(QGuiApplication::mouseButtons(), Qt::NoButton);
+    EXPECT_EQ(pressedMouseButtons(), 1U);
+    controller.DoZoomIn();
+    screen->release();
+    controller.DoZoomIn();
+    EXPECT_THAT(sent(), ElementsAre("recv_ptz_zoom_speed(r1, 0.1)", "recv_ptz_zoom_speed(r1, 0)"));
+    press("panLeft");
+    ASSERT_THAT(sentOnce(3).back(), "recv_ptz_pan_tilt_speed(r1, 0.1, 0)");
+    screen->release(); // which nobody has read yet
+    EXPECT_EQ(QGuiApplication::mouseButtons(), Qt::LeftButton);
+    controller.DoPanLeft();
+    EXPECT_THAT(sent(), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0)"));
 }
 
 TEST_F(PTZViewControllerTest, StoreButtonOnAndPreset3PressedStoresOnceAndRecallsAfterwards) {
