@@ -118,6 +118,16 @@ void MotionKeys::letAllGo() {
     announce(changed);
 }
 
+void MotionKeys::tellAgain() {
+    Motion held;
+    for (const HeldKey& key : m_held) {
+        held.pan |= key.motion.pan;
+        held.tilt |= key.motion.tilt;
+        held.zoom |= key.motion.zoom;
+    }
+    announce(held);
+}
+
 /// Tells the sums of those kinds of motion that a key has changed.
 void MotionKeys::announce(const Motion& changed) {
     Motion sum;

@@ -21,6 +21,9 @@ class MotionKeys : public QObject {
     /// The keys of that top-level window, which must outlive this object.
     explicit MotionKeys(QWidget* window);
 
+    /// Tells the motion of the keys that are held once more, if any are: something else has put an end to it.
+    void tellAgain();
+
   signals:
     /// The direction that the held keys make up has changed, each part -1, 0 or 1: left and up are positive. Repeated
     /// where a key changes nothing, so that the last letting go is always told.

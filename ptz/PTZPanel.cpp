@@ -73,6 +73,21 @@ void PTZPanel::connectKeys() {
     m_keys = std::make_unique<MotionKeys>(this);
     connect(m_keys.get(), &MotionKeys::panTilt, m_controller.get(), &PTZViewController::panTiltToward);
     connect(m_keys.get(), &MotionKeys::zoom, m_controller.get(), &PTZViewController::zoomToward);
+    // What a key that is let go has stopped goes on where a button holds it, and the other way round. When the panel
+    // has lost the keyboard nothing goes on.
+    connect(m_keys.get(), &MotionKeys::panTilt, this, [this](int pan, int tilt) {
+        if (pan == 0 && tilt == 0 && isActiveWindow()) {
+            pressHeld({m_ui->panLeft, m_ui->panRight, m_ui->tiltUp, m_ui->tiltDown});
+        }
+    });
+    connect(m_keys.get(), &MotionKeys::zoom, this, [this](int direction) {
+        if (direction == 0 && isActiveWindow()) {
+            pressHeld({m_ui->zoomIn, m_ui->zoomOut});
+        }
+    });
+    for (const HoldButton* button : findChildren<HoldButton*>()) {
+        connect(button, &HoldButton::released, m_keys.get(), &MotionKeys::tellAgain);
+    }
     connect(m_keys.get(), &MotionKeys::preset, this, [this](int number) {
         for (QAbstractButton* button : m_ui->presets->buttons()) {
             if (button->property("tag").toInt() == number) {
@@ -80,6 +95,14 @@ void PTZPanel::connectKeys() {
             }
         }
     });
+}
+
+void PTZPanel::pressHeld(std::initializer_list<HoldButton*> buttons) {
+    for (HoldButton* button : buttons) {
+        if (button->isDown()) {
+            emit button->pressed();
+        }
+    }
 }
 
 /// The slider also counts when it is grabbed where it stands, which takes the focus back from the camera's automatic.

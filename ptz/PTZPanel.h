@@ -2,6 +2,7 @@
 
 #include <QWidget>
 
+#include <initializer_list>
 #include <memory>
 
 namespace Ui {
@@ -10,6 +11,7 @@ class PTZPanel;
 
 namespace qivo {
 
+class HoldButton;
 class MotionKeys;
 class PTZViewController;
 
@@ -39,6 +41,7 @@ class PTZPanel : public QWidget {
     void drawSymbols();
     void connectMotion();
     void connectKeys();
+    static void pressHeld(std::initializer_list<HoldButton*> buttons);
     void connectFocusAndPresets();
     QPoint placeBesideParent() const;
 

@@ -36,6 +36,26 @@ TEST_F(PTZPanelTest, EveryControlTellsItsNameAndPurpose) {
     EXPECT_EQ(names.size(), controls.size());
 }
 
+/// A press without a pointer, as a screen reader makes it, cannot be held: the description tells what can.
+TEST_F(PTZPanelTest, MotionButtonsDescribeTheKeyThatIsHeldInTheirPlace) {
+    for (const auto& [name, key] : {std::pair{"panLeft", "Left"},
+                                    {"panRight", "Right"},
+                                    {"tiltUp", "Up"},
+                                    {"tiltDown", "Down"},
+                                    {"zoomIn", "plus"},
+                                    {"zoomOut", "minus"}}) {
+        QAccessibleInterface* accessible = QAccessible::queryAccessibleInterface(control(name));
+        ASSERT_NE(accessible, nullptr);
+        EXPECT_THAT(accessible->text(QAccessible::Description).toStdString(),
+                    testing::HasSubstr(std::string("the ") + key + " "))
+            << name;
+        control(name)->click();
+    }
+    EXPECT_THAT(sent(),
+                testing::Each(testing::AnyOf("recv_ptz_zoom_speed(r1, 0)", "recv_ptz_pan_tilt_speed(r1, 0, 0)")))
+        << "nothing moves that cannot be held";
+}
+
 TEST_F(PTZPanelTest, ButtonsStandAsACrossAndTheirLooksDiffer) {
     const auto place = [&](const char* name) { return middleOf(control(name)); };
     EXPECT_EQ(place("panLeft").y(), place("panRight").y());
@@ -124,6 +144,42 @@ TEST_F(PTZPanelTest, KeyboardLostWhileAButtonIsHeldStopsTheCameraAndReleaseStops
     ASSERT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, -0.1)"));
     screen->activate(*screen->findWindow("Main"));
     EXPECT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0)"));
+    screen->release();
+    EXPECT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0)"));
+}
+
+TEST_F(PTZPanelTest, ButtonLetGoLeavesTheMotionOfAHeldKey) {
+    press("panLeft");
+    ASSERT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0.1, 0)"));
+    screen->pressKey("Up");
+    EXPECT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0.1)")) << "the newest counts";
+    screen->release();
+    EXPECT_THAT(sentOnce(2), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0)", "recv_ptz_pan_tilt_speed(r1, 0, 0.1)"));
+    screen->releaseKey("Up");
+    EXPECT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0)"));
+}
+
+TEST_F(PTZPanelTest, KeyLetGoLeavesTheMotionOfAHeldButton) {
+    press("zoomIn");
+    ASSERT_THAT(sentOnce(1), ElementsAre("recv_ptz_zoom_speed(r1, 0.1)"));
+    screen->key("Left");
+    EXPECT_THAT(sentOnce(2), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0.1, 0)", "recv_ptz_pan_tilt_speed(r1, 0, 0)"))
+        << "the zoom goes on anyway";
+    screen->key("minus");
+    EXPECT_THAT(sentOnce(3), ElementsAre("recv_ptz_zoom_speed(r1, -0.1)", "recv_ptz_zoom_speed(r1, 0)",
+                                         "recv_ptz_zoom_speed(r1, 0.1)"));
+    screen->release();
+    EXPECT_THAT(sentOnce(1), ElementsAre("recv_ptz_zoom_speed(r1, 0)"));
+}
+
+TEST_F(PTZPanelTest, KeyboardLostWhileKeyAndButtonAreHeldStopsForGood) {
+    press("tiltUp");
+    ASSERT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0.1)"));
+    screen->pressKey("Down");
+    ASSERT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, -0.1)"));
+    screen->activate(*screen->findWindow("Main"));
+    EXPECT_THAT(sentOnce(2), testing::Each("recv_ptz_pan_tilt_speed(r1, 0, 0)"));
+    screen->releaseKey("Down");
     screen->release();
     EXPECT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0)"));
 }
