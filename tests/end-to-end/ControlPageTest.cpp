@@ -17,7 +17,10 @@ namespace {
 
 using namespace std::chrono_literals;
 
-constexpr const char* arrowLeft = "\xEE\x80\x92"; // as WebDriver writes it: U+E012
+// Keys as WebDriver writes them: U+E012, U+E010, U+E011.
+constexpr const char* arrowLeft = "\xEE\x80\x92";
+constexpr const char* endKey = "\xEE\x80\x90";
+constexpr const char* homeKey = "\xEE\x80\x91";
 
 /// A camera, its viewer, and the page that the viewer opens in a browser.
 class ControlPagesTest : public ViewerTest {
@@ -27,7 +30,13 @@ class ControlPagesTest : public ViewerTest {
         m_folder = std::string(std::getenv("HOME")) + "/bin";
         std::filesystem::create_directories(m_folder);
         std::filesystem::remove(m_folder + "/opened");
-        m_publisher = publish("STUDIO", {"Cam 1"}, {"--ptz", "--http-port", "0"});
+        serve();
+    }
+    void serve(const std::vector<std::string>& more = {}) {
+        m_publisher.reset();
+        std::vector<std::string> options{"--ptz", "--http-port", "0"};
+        options.insert(options.end(), more.begin(), more.end());
+        m_publisher = publish("STUDIO", {"Cam 1"}, options);
         ASSERT_TRUE(m_publisher && m_publisher->waitForOutput(", ONVIF"));
     }
 
@@ -47,10 +56,11 @@ class ControlPagesTest : public ViewerTest {
         const std::size_t begin = output.find("http://");
         return output.substr(begin, output.find(' ', begin) - begin);
     }
-    void openPage(bool phone = false) {
+    /// `login` is "USER:PASSWORD@" or empty.
+    void openPage(bool phone = false, const std::string& login = "") {
         m_browser = WebBrowser::start(phone);
         ASSERT_NE(m_browser, nullptr) << "no Chromium";
-        m_browser->open(pageAddress());
+        m_browser->open(pageAddress().insert(std::string("http://").size(), login));
         ASSERT_TRUE(eventually([this] { return position().has_value(); }));
     }
 
@@ -164,7 +174,7 @@ TEST_F(ControlPagesTest, leavingTheButtonAnotherTabAndAStoppedBrowserStopTheCame
     m_browser->press("[data-zoom=\"1\"]");
     ASSERT_TRUE(seen([](const PositionCode& now) { return now.zoom > 0.05; }));
     m_browser->run("window.fetchAsItWas = window.fetch;"
-                   "window.fetch = (url, ...rest) => url === 'command' ? new Promise(() => {}) : "
+                   "window.fetch = (url, ...rest) => url.endsWith('/command') ? new Promise(() => {}) : "
                    "window.fetchAsItWas(url, ...rest);");
     EXPECT_TRUE(stands(1200ms));
     EXPECT_LT(position()->zoom, 0.95);
@@ -205,6 +215,64 @@ TEST_F(ControlPagesTest, aFingerOnAPhoneTurnsUntilItLeaves) {
         return m_browser->run("return document.querySelector('#presets button:nth-child(2)').className").toString() ==
                "kept";
     }));
+}
+
+TEST_F(ControlPagesTest, theLoginOfThePageIsTheLoginOfItsCommands) {
+    serve({"--login", "ann:secret"});
+    openPage(false, "ann:secret@");
+    EXPECT_EQ(m_browser->text("#name"), "STUDIO (Cam 1)");
+    m_browser->press(".left");
+    EXPECT_TRUE(seen([](const PositionCode& now) { return now.pan < -0.2; }));
+    m_browser->releaseAll();
+    EXPECT_TRUE(stands());
+    EXPECT_GT(position()->pan, -0.95);
+    EXPECT_TRUE(eventually([this] { return m_browser->text("#state") == "Live"; }));
+    EXPECT_EQ(m_browser->text("#viewers"), "1 viewer");
+}
+
+TEST_F(ControlPagesTest, theFocusGoesFromFarToNearAndBackToTheAutomatic) {
+    openPage();
+    const auto isAutomatic = [this] {
+        return m_browser->run("return document.getElementById(\"automatic\").checked").toBool();
+    };
+    EXPECT_TRUE(eventually(isAutomatic));
+    m_browser->run("document.getElementById('focus').focus()");
+    m_browser->typeKey(endKey);
+    EXPECT_TRUE(seen([](const PositionCode& now) { return now.focus < 0.01; })) << "not the nearest";
+    EXPECT_FALSE(isAutomatic());
+    m_browser->typeKey(homeKey);
+    EXPECT_TRUE(seen([](const PositionCode& now) { return now.focus > 0.99; })) << "not the farthest";
+    m_browser->click("#automatic");
+    EXPECT_TRUE(seen([](const PositionCode& now) { return std::abs(now.focus - 0.5) < 0.01; }));
+    EXPECT_TRUE(isAutomatic());
+    EXPECT_TRUE(eventually([this] {
+        return m_browser->run("return Number(document.getElementById(\"focus\").value)").toDouble() == 0.5;
+    }));
+    m_browser->click("#automatic");
+    EXPECT_TRUE(eventually([this] {
+        return m_browser->run("return fetch(at('state')).then((answer) => answer.json())")["automaticFocus"] == false;
+    }));
+    EXPECT_THAT(m_browser->complaints(), testing::IsEmpty());
+}
+
+TEST_F(ControlPagesTest, onlyTheNewestPlaceOfTheFocusIsSent) {
+    openPage();
+    // The first command is held back for a while; meanwhile the slider moves on.
+    m_browser->run("window.places = []; window.fetchAsItWas = window.fetch;"
+                   "window.fetch = async (url, options) => {"
+                   "  if (url.endsWith('/command')) {"
+                   "    window.places.push(JSON.parse(options.body).value);"
+                   "    await new Promise((done) => setTimeout(done, window.places.length === 1 ? 500 : 0));"
+                   "  }"
+                   "  return window.fetchAsItWas(url, options);"
+                   "};"
+                   "for (const place of [0.9, 0.8, 0.7, 0.6, 0.2]) {"
+                   "  const slider = document.getElementById('focus');"
+                   "  slider.value = place; slider.dispatchEvent(new Event('input'));"
+                   "}");
+    EXPECT_TRUE(seen([](const PositionCode& now) { return std::abs(now.focus - 0.8) < 0.01; }));
+    const QJsonArray places = m_browser->run("return window.places").toArray();
+    EXPECT_EQ(places, (QJsonArray{0.1, 0.8})) << places.size();
 }
 
 TEST_F(ControlPagesTest, aPublisherThatGoesIsSaid) {

@@ -32,6 +32,7 @@ constexpr Place kPanLeft{40, 84};
 constexpr Place kTiltUp{96, 36};
 constexpr Place kZoomIn{-40, 36};
 constexpr Place kZoomOut{-40, 132};
+constexpr Place kFocus{90, 199}; // the slider's handle, in the middle
 constexpr Place kMargin{6, 6};
 
 double distance(const PositionCode& one, const PositionCode& other) {
@@ -59,6 +60,11 @@ class PTZTest : public ViewerTest {
         const auto time = readTimeCode(pixels, box.width, box.height, stride);
         const auto position = readPositionCode(pixels, box.width, box.height, stride);
         return time && position ? std::optional(Shown{*time, *position}) : std::nullopt;
+    }
+
+    /// Of the first source's stream.
+    static std::string addressOf(const Process& publisher) {
+        return publisher.output().substr(0, publisher.output().find(' '));
     }
 
     bool shows(const std::function<bool(const PositionCode&)>& condition, milliseconds deadline = seconds(20)) const {
@@ -227,36 +233,6 @@ TEST_F(PTZTest, APresetIsStoredAndRecalled) {
     EXPECT_NEAR(after->y, before->y, 2);
 }
 
-TEST_F(PTZTest, AnotherSourceChosenClosesThePanelAndStopsTheCamera) {
-    const auto publisher = publish("STUDIO", {"Cam 1", "Cam 2"}, {"--ptz"});
-    ASSERT_NO_FATAL_FAILURE(steer(0, "STUDIO (Cam 1)"));
-    m_screen->activate(*window());
-    ASSERT_TRUE(eventually([&] { return m_screen->isActive(*window()); }));
-    choose(0, 1, "STUDIO (Cam 2)");
-    EXPECT_TRUE(eventually([&] { return !m_screen->findWindow(kPanel).has_value(); }));
-    ASSERT_TRUE(picturesArrive(now()));
-    EXPECT_TRUE(shows([](const PositionCode& at) { return distance(at, {}) <= kSamePlace; }));
-}
-
-TEST_F(PTZTest, LowBandwidthToggledWhileAButtonIsHeldSteersThisCameraAlone) {
-    const auto publisher = publish("STUDIO", {"Cam 1", "Cam 2"}, {"--ptz"});
-    ASSERT_NO_FATAL_FAILURE(steer(0, "STUDIO (Cam 1)"));
-    press(kPanLeft);
-    m_screen->key("Control+l");
-    ASSERT_TRUE(picturesArrive(now() + 500));
-    EXPECT_TRUE(stands()) << "the receiver that moved it has gone";
-    m_screen->release();
-    ASSERT_TRUE(m_screen->findWindow(kPanel)) << "the panel stays";
-    m_screen->activate(*m_screen->findWindow(kPanel));
-    ASSERT_NO_FATAL_FAILURE(waitForControl());
-    m_screen->activate(*window());
-    ASSERT_TRUE(eventually([&] { return m_screen->isActive(*window()); }));
-    choose(0, 1, "STUDIO (Cam 2)");
-    EXPECT_TRUE(shows([](const PositionCode& at) { return distance(at, {}) <= kSamePlace; }))
-        << "the other camera was steered";
-    EXPECT_TRUE(m_viewer->running());
-}
-
 /// The pictures of a camera as a second watcher gets them.
 struct Track {
     std::int64_t lastMotion = 0;
@@ -282,11 +258,65 @@ void follow(Watcher& watcher, std::int64_t until, std::optional<PositionCode>& l
     }
 }
 
+TEST_F(PTZTest, TheFocusSliderGoesFromFarToNearAndTheAutomaticTakesItBack) {
+    const auto publisher = publish("STUDIO", {"Cam 1"}, {"--ptz"});
+    ASSERT_NO_FATAL_FAILURE(steer(0, "STUDIO (Cam 1)"));
+    press(kFocus);
+    dragTo({-1, kFocus.y});
+    EXPECT_TRUE(shows([](const PositionCode& at) { return at.focus == 0; })) << "not the nearest";
+    dragTo({1, kFocus.y});
+    EXPECT_TRUE(shows([](const PositionCode& at) { return at.focus == 1; })) << "not the farthest";
+    m_screen->release();
+    m_screen->key("Alt+a");
+    EXPECT_TRUE(shows([](const PositionCode& at) { return std::abs(at.focus - 0.5) < 0.01; }));
+}
+
+TEST_F(PTZTest, AnotherSourceChosenClosesThePanelAndStopsTheCamera) {
+    const auto publisher = publish("STUDIO", {"Cam 1", "Cam 2"}, {"--ptz"});
+    ASSERT_NO_FATAL_FAILURE(steer(0, "STUDIO (Cam 1)"));
+    Watcher watcher(addressOf(*publisher), "tcp");
+    std::optional<PositionCode> last;
+    Track track;
+    press(kPanLeft);
+    ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + 500, last, track));
+    EXPECT_GT(track.motions, 3) << "the camera does not move";
+    const std::int64_t chosen = now();
+    m_screen->activate(*window());
+    ASSERT_TRUE(eventually([&] { return m_screen->isActive(*window()); }));
+    choose(0, 1, "STUDIO (Cam 2)");
+    EXPECT_TRUE(eventually([&] { return !m_screen->findWindow(kPanel).has_value(); }));
+    ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + kStandsWithin.count(), last, track));
+    m_screen->release();
+    ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + kStandsWithin.count(), last, track));
+    EXPECT_GT(track.lastMotion, chosen - 200) << "it stood before";
+    EXPECT_LE(track.lastMotion, chosen + kStandsWithin.count()) << "in ms; the button was held until the end";
+    ASSERT_TRUE(picturesArrive(now()));
+    EXPECT_TRUE(shows([](const PositionCode& at) { return distance(at, {}) <= kSamePlace; }));
+}
+
+TEST_F(PTZTest, LowBandwidthToggledWhileAButtonIsHeldSteersThisCameraAlone) {
+    const auto publisher = publish("STUDIO", {"Cam 1", "Cam 2"}, {"--ptz"});
+    ASSERT_NO_FATAL_FAILURE(steer(0, "STUDIO (Cam 1)"));
+    press(kPanLeft);
+    m_screen->key("Control+l");
+    ASSERT_TRUE(picturesArrive(now() + 500));
+    EXPECT_TRUE(stands()) << "the receiver that moved it has gone";
+    m_screen->release();
+    ASSERT_TRUE(m_screen->findWindow(kPanel)) << "the panel stays";
+    m_screen->activate(*m_screen->findWindow(kPanel));
+    ASSERT_NO_FATAL_FAILURE(waitForControl());
+    m_screen->activate(*window());
+    ASSERT_TRUE(eventually([&] { return m_screen->isActive(*window()); }));
+    choose(0, 1, "STUDIO (Cam 2)");
+    EXPECT_TRUE(shows([](const PositionCode& at) { return distance(at, {}) <= kSamePlace; }))
+        << "the other camera was steered";
+    EXPECT_TRUE(m_viewer->running());
+}
+
 TEST_F(PTZTest, AViewerKilledWhileAButtonIsHeldLeavesTheCameraStandingWithinASecond) {
     const auto publisher = publish("STUDIO", {"Cam 1"}, {"--ptz"});
     ASSERT_NO_FATAL_FAILURE(steer(0, "STUDIO (Cam 1)"));
-    const std::string address = publisher->output().substr(0, publisher->output().find(' '));
-    Watcher watcher(address, "tcp");
+    Watcher watcher(addressOf(*publisher), "tcp");
     std::optional<PositionCode> last;
     Track track;
     press(kPanLeft);

@@ -6,6 +6,8 @@ const pictureTime = 8000;
 const stateTime = 1000;
 
 const me = Array.from(crypto.getRandomValues(new Uint8Array(12)), (byte) => byte.toString(16).padStart(2, "0")).join("");
+// A page that was opened with a login in its address may ask for nothing at addresses relative to that.
+const at = (name) => location.origin + location.pathname + name;
 const element = (id) => document.getElementById(id);
 
 // A signal that ends what takes longer; browsers before 2022 have none that does so by itself.
@@ -37,7 +39,7 @@ let renewed = 0;
 
 function post(command, last) {
     order += 1;
-    return fetch("command", {
+    return fetch(at("command"), {
         method: "POST",
         headers: {"Content-Type": "application/json"},
         body: JSON.stringify({...command, page: me, order}),
@@ -338,7 +340,7 @@ async function look() {
     looking = true;
     while (!document.hidden) {
         try {
-            const answer = await fetch("picture.jpg?page=" + me + "&after=" + shown,
+            const answer = await fetch(at("picture.jpg?page=" + me + "&after=" + shown),
                 {signal: within(pictureTime)});
             if (!answer.ok) {
                 throw new Error("no picture");
@@ -378,7 +380,7 @@ async function update() {
         return;
     }
     try {
-        const answer = await fetch("state", {signal: within(commandTime)});
+        const answer = await fetch(at("state"), {signal: within(commandTime)});
         if (answer.ok) {
             const state = await answer.json();
             if (live) {
