@@ -1,4 +1,6 @@
 #include "tests/tools/Publisher.h"
+#include "tests/tools/Watcher.h"
+#include "tools/publish/PositionCode.h"
 
 #include <gtest/gtest.h>
 
@@ -44,6 +46,24 @@ class OnvifLibraryPeers : public testing::Test {
         return function(text.data(), m_camera);
     }
 
+    // Waits for a picture of the camera for which the condition holds.
+    template <typename Condition>
+    bool shows(Watcher& watcher, const Condition& condition) {
+        const auto deadline = std::chrono::steady_clock::now() + 15s;
+        while (std::chrono::steady_clock::now() < deadline) {
+            const auto frame = watcher.next(5s);
+            const auto at = frame ? readPositionCode(frame->pixels.data(), frame->width, frame->height,
+                                                     static_cast<std::ptrdiff_t>(4) * frame->width)
+                                  : std::nullopt;
+            m_last = at.value_or(m_last);
+            if (at && condition(*at)) {
+                return true;
+            }
+        }
+        return false;
+    }
+
+    PositionCode m_last;
     Session m_session;
     OnvifData* m_camera = m_session.camera.get();
 };
@@ -53,11 +73,26 @@ TEST_F(OnvifLibraryPeers, findsReadsMovesStopsAndRecalls) {
     ASSERT_NO_FATAL_FAILURE(find("admin", "x"));
     EXPECT_EQ(m_camera->stream_uri, publisher.address(0));
     EXPECT_STREQ(m_camera->profileToken, "full");
+    Watcher watcher(publisher.address(0), "tcp");
     EXPECT_EQ(preset(setPreset, "3"), 0) << m_camera->last_error;
     EXPECT_EQ(continuousMove(0.5F, 0.25F, 0.1F, m_camera), 0) << m_camera->last_error;
+    EXPECT_TRUE(shows(watcher, [](const PositionCode& at) { return at.pan > 0.05 && at.tilt > 0.02 && at.zoom > 0; }));
     EXPECT_EQ(moveStop(PAN_TILT_STOP, m_camera), 0) << m_camera->last_error;
+    const PositionCode turned = m_last;
+    EXPECT_TRUE(shows(watcher, [&](const PositionCode& at) { return at.zoom > turned.zoom + 0.01; }));
+    const double pan = m_last.pan;
+    EXPECT_TRUE(shows(watcher, [&](const PositionCode& at) { return at.zoom > turned.zoom + 0.03; }));
+    EXPECT_EQ(m_last.pan, pan) << "it turns on";
     EXPECT_EQ(moveStop(ZOOM_STOP, m_camera), 0) << m_camera->last_error;
+    int pictures = 0;
+    double zoom = -1;
+    EXPECT_TRUE(shows(watcher, [&](const PositionCode& at) {
+        pictures = at.zoom == zoom ? pictures + 1 : 0;
+        zoom = at.zoom;
+        return pictures == 10;
+    })) << "it zooms on";
     EXPECT_EQ(preset(gotoPreset, "3"), 0) << m_camera->last_error;
+    EXPECT_TRUE(shows(watcher, [](const PositionCode& at) { return at.pan == 0 && at.tilt == 0 && at.zoom == 0; }));
     EXPECT_NE(preset(gotoPreset, "4"), 0);
     EXPECT_STREQ(m_camera->last_error, "ter:InvalidArgVal");
 }
