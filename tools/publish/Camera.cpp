@@ -249,7 +249,7 @@ bool Camera::storePreset(const std::string& token, const std::string& name) {
 
 std::string Camera::freePreset(const std::string& name) const {
     const std::lock_guard lock(m_mutex);
-    const std::string last = name.substr(name.rfind(' ') + 1); // all of it where there is no blank
+    std::string last = name.substr(name.rfind(' ') + 1); // all of it where there is no blank
     if (const int wanted = presetNumber(last); wanted != 0 && m_presets.count(wanted) == 0) {
         return last;
     }
