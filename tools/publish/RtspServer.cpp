@@ -5,6 +5,7 @@ namespace {
 
 constexpr const char* viewerRole = "viewer";
 constexpr guint pictureStream = 0; // of a media, by its payloader's number
+constexpr guint secondsBetweenCleanups = 1;
 
 void onPlay(GstRTSPClient*, GstRTSPContext* context, gpointer) {
     if (context->media != nullptr) {
@@ -12,14 +13,27 @@ void onPlay(GstRTSPClient*, GstRTSPContext* context, gpointer) {
     }
 }
 
-void onClientConnected(GstRTSPServer*, GstRTSPClient* client, gpointer) {
+void onNewSession(GstRTSPClient*, GstRTSPSession* session, gpointer timeout) {
+    gst_rtsp_session_set_timeout(session, GPOINTER_TO_UINT(timeout));
+}
+
+void onClientConnected(GstRTSPServer*, GstRTSPClient* client, gpointer timeout) {
+    g_signal_connect(client, "new-session", G_CALLBACK(onNewSession), timeout);
     g_signal_connect(client, "play-request", G_CALLBACK(onPlay), nullptr);
+}
+
+// The server looks for sessions that have run out only when it is told to.
+gboolean onCleanup(gpointer server) {
+    const Object<GstRTSPSessionPool> sessions(gst_rtsp_server_get_session_pool(static_cast<GstRTSPServer*>(server)));
+    gst_rtsp_session_pool_cleanup(sessions.get());
+    return G_SOURCE_CONTINUE;
 }
 
 } // namespace
 
-RtspServer::RtspServer() : m_server(gst_rtsp_server_new()) {
-    g_signal_connect(m_server.get(), "client-connected", G_CALLBACK(onClientConnected), nullptr);
+RtspServer::RtspServer(std::chrono::seconds sessionTimeout) : m_server(gst_rtsp_server_new()) {
+    g_signal_connect(m_server.get(), "client-connected", G_CALLBACK(onClientConnected),
+                     GUINT_TO_POINTER(static_cast<guint>(sessionTimeout.count())));
 }
 
 RtspServer::~RtspServer() {
@@ -85,6 +99,7 @@ std::string RtspServer::listen(int port, bool loopbackOnly) {
     std::string reason;
     const bool anyWillDo = port < 0;
     if (attach(anyWillDo ? preferredPort : port, reason) || (anyWillDo && attach(0, reason))) {
+        m_cleanup = g_timeout_add_seconds(secondsBetweenCleanups, onCleanup, m_server.get());
         return {};
     }
     return "cannot serve at port " + std::to_string(port) + ": " + reason +
@@ -100,6 +115,7 @@ void RtspServer::stop() {
         return;
     }
     g_source_remove(m_source);
+    g_source_remove(m_cleanup);
     m_source = 0;
     const auto remove = [](GstRTSPServer*, GstRTSPClient*, gpointer) { return GST_RTSP_FILTER_REMOVE; };
     g_list_free_full(gst_rtsp_server_client_filter(m_server.get(), remove, nullptr), g_object_unref);

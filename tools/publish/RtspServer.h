@@ -4,6 +4,7 @@
 #include "tools/publish/Login.h"
 #include "tools/publish/Stream.h"
 
+#include <chrono>
 #include <gst/rtsp-server/rtsp-server.h>
 #include <string>
 
@@ -12,7 +13,11 @@ namespace qivo {
 /** The RTSP server of this process. Lives on the thread of the default main context. */
 class RtspServer {
   public:
-    RtspServer();
+    /** Of a viewer who has sent nothing for this long, neither a request nor an RTCP report, the server takes leave
+     *  (five to six seconds later: who keeps the session alive at the last moment may be late). */
+    static constexpr std::chrono::seconds usualSessionTimeout{60};
+
+    explicit RtspServer(std::chrono::seconds sessionTimeout = usualSessionTimeout);
     ~RtspServer();
     RtspServer(const RtspServer&) = delete;
     RtspServer& operator=(const RtspServer&) = delete;
@@ -21,7 +26,7 @@ class RtspServer {
     void requireLogin(const Login& login);
 
     /** Those who play the picture of the stream under a path at this moment. One who went without a word is among them
-     *  until the server's time-out, a minute at most. */
+     *  until the session's time-out. */
     [[nodiscard]] int viewers(const std::string& path) const;
 
     /** Serves a stream under a path, which begins with "/". */
@@ -42,6 +47,7 @@ class RtspServer {
 
     Object<GstRTSPServer> m_server;
     guint m_source = 0;
+    guint m_cleanup = 0; // the timer that ends sessions
     bool m_loginNeeded = false;
 };
 
