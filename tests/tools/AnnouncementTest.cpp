@@ -5,6 +5,9 @@
 #include <gtest/gtest.h>
 
 #include <csignal>
+#include <netinet/in.h>
+#include <sys/socket.h>
+#include <unistd.h>
 
 namespace qivo::test {
 namespace {
@@ -73,6 +76,48 @@ TEST(Announcement, addressThatComesLaterIsAnnounced) {
     const auto added = Process::start({"/bin/sh", "-c", "ip address add 127.0.0.77/8 dev lo"});
     ASSERT_EQ(added->wait(5s), 0) << added->errors();
     EXPECT_TRUE(browser.waitForAddress("STUDIO (Cam 1)", "127.0.0.77"));
+}
+
+TEST(Announcement, addressesOfACameraFollowTheMachines) {
+    const auto publisher = Process::start(
+        {PUBLISH, "--machine", "STUDIO", "--source", "Cam 1", "--ptz", "--port", "0", "--http-port", "0"},
+        {withoutLeakCheck});
+    const auto text = [](const char* key) {
+        const Browser browser;
+        return browser.waitFor("STUDIO (Cam 1)") ? browser.found()["STUDIO (Cam 1)"].text[key] : "";
+    };
+    EXPECT_THAT(text("web"), testing::StartsWith("http://127.0.0.1:"));
+    EXPECT_THAT(text("onvif"), testing::StartsWith("http://127.0.0.1:"));
+    const auto plugged =
+        Process::start({"/bin/sh", "-c",
+                        "ip link add cable type veth peer name wall && ip link set wall up && ip link set cable up && "
+                        "ip address add 192.0.2.7/24 dev cable"});
+    ASSERT_EQ(plugged->wait(5s), 0) << plugged->errors();
+    const auto deadline = std::chrono::steady_clock::now() + 15s;
+    std::string web = text("web");
+    while (web.rfind("http://192.0.2.7:", 0) != 0 && std::chrono::steady_clock::now() < deadline) {
+        web = text("web");
+    }
+    const auto unplugged = Process::start({"/bin/sh", "-c", "ip link delete cable"});
+    EXPECT_EQ(unplugged->wait(5s), 0) << unplugged->errors();
+    EXPECT_THAT(web, testing::MatchesRegex("http://192\\.0\\.2\\.7:[0-9]+/source-1/"));
+}
+
+TEST(Announcement, portThatAnotherHoldsAloneIsTriedAgain) {
+    const int alone = socket(AF_INET, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+    sockaddr_in place{};
+    place.sin_family = AF_INET;
+    place.sin_port = htons(5353);
+    ASSERT_EQ(bind(alone, reinterpret_cast<const sockaddr*>(&place), sizeof place), 0);
+    PublishProcess publisher({"--machine", "STUDIO", "--source", "Cam 1"});
+    // Through a few tries: the reason is said once.
+    EXPECT_FALSE(publisher.process().wait(2s));
+    EXPECT_THAT(publisher.process().errors(),
+                testing::MatchesRegex("qivo-publish: cannot announce on the network: [^\n]*; it is tried again, the "
+                                      "addresses above are served all the same\n"));
+    close(alone);
+    const Browser browser;
+    EXPECT_TRUE(browser.waitFor("STUDIO (Cam 1)"));
 }
 
 TEST(Announcement, nameThatAnotherUsesGetsANumberAndIsReported) {

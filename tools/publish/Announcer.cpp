@@ -11,14 +11,17 @@
 #include <avahi-common/error.h>
 #include <avahi-common/malloc.h>
 #include <avahi-common/thread-watch.h>
+#include <avahi-common/timeval.h>
 #include <avahi-core/core.h>
 #include <avahi-core/log.h>
 #include <avahi-core/publish.h>
+#include <chrono>
 #include <linux/netlink.h>
 #include <linux/rtnetlink.h>
 #include <optional>
 #include <sys/socket.h>
 #include <unistd.h>
+#include <utility>
 
 namespace qivo {
 namespace {
@@ -62,6 +65,10 @@ constexpr const char* serviceType = "_rtsp._tcp";
 // Names that are tried before a source gives up being announced.
 constexpr int maximumAttempts = 50;
 
+// Pause before the network is tried again; doubles up to the second.
+constexpr std::chrono::milliseconds firstRetryPause{250};
+constexpr std::chrono::milliseconds longestRetryPause{8000};
+
 // A name of this process's own for the machine's addresses. Another stack of the same machine, which announces the
 // host's name, ends one day and says goodbye to that; these sources must not lose their addresses by it.
 std::string hostLabel(std::uint16_t port) {
@@ -87,12 +94,20 @@ int openAddressNews() {
     return news;
 }
 
-Strings textRecords(const Announcement& announcement) {
+std::string onThisMachine(const std::string& address, const std::string& host) {
+    return address.rfind(':', 0) == 0 ? "http://" + host + address : address;
+}
+
+bool namesThisMachine(const Announcement& announcement) {
+    return announcement.web.rfind(':', 0) == 0 || announcement.onvif.rfind(':', 0) == 0;
+}
+
+Strings textRecords(const Announcement& announcement, const std::string& host) {
     Strings strings(avahi_string_list_add_pair(nullptr, "path", announcement.path.c_str()));
     strings.reset(avahi_string_list_add_pair(strings.release(), "low", announcement.low.c_str()));
     for (const auto& [key, value] : {std::pair{"web", &announcement.web}, std::pair{"onvif", &announcement.onvif}}) {
         if (!value->empty()) {
-            strings.reset(avahi_string_list_add_pair(strings.release(), key, value->c_str()));
+            strings.reset(avahi_string_list_add_pair(strings.release(), key, onThisMachine(*value, host).c_str()));
         }
     }
     return strings;
@@ -128,11 +143,16 @@ class Announcer::Implementation {
     static void onGroup(AvahiServer* server, AvahiSEntryGroup* group, AvahiEntryGroupState state, void* entry);
     static void onHost(AvahiServer* server, AvahiSEntryGroup* group, AvahiEntryGroupState state, void* self);
     static void onAddressNews(AvahiWatch* watch, int news, AvahiWatchEvent event, void* self);
+    static void onRetry(AvahiTimeout* timeout, void* self);
+    void open();
+    void retryLater(const std::string& reason);
     void watchAddresses();
+    [[nodiscard]] std::string host() const;
     void serverChanged(AvahiServer* server, AvahiServerState state);
     void takeNextHostName(AvahiServer* server);
     void announceHost(AvahiServer* server);
     void announceAll(AvahiServer* server);
+    void renewTexts(AvahiServer* server);
     void announce(AvahiServer* server, Entry& entry);
     int tryName(AvahiServer* server, Entry& entry);
     bool takeNextName(Entry& entry);
@@ -146,6 +166,10 @@ class Announcer::Implementation {
     AvahiSEntryGroup* m_hostGroup = nullptr; // the server's
     int m_addressNews = -1;                  // owned
     AvahiWatch* m_addressWatch = nullptr;    // owned
+    AvahiTimeout* m_retry = nullptr;         // owned; set while there is to be another try
+    std::chrono::milliseconds m_retryPause = firstRetryPause;
+    std::string m_reported; // why the network could not be used, as last told
+    std::string m_host;     // in the addresses announced
     std::unique_ptr<AvahiThreadedPoll, FreePoll> m_poll;
     std::optional<ListeningPoll> m_listeningPoll; // the server's view of it
     std::unique_ptr<AvahiServer, FreeServer> m_server;
@@ -154,6 +178,19 @@ class Announcer::Implementation {
 std::string Announcer::Implementation::start() {
     avahi_set_log_function([](AvahiLogLevel, const char*) {}); // what a user needs to know is said by state
     m_poll.reset(avahi_threaded_poll_new());
+    if (!m_poll) {
+        return "cannot announce on the network: no memory";
+    }
+    m_listeningPoll.emplace(*avahi_threaded_poll_get(m_poll.get()));
+    open();
+    watchAddresses();
+    if (avahi_threaded_poll_start(m_poll.get()) < 0) {
+        return "cannot announce on the network: the system gives no thread";
+    }
+    return {};
+}
+
+void Announcer::Implementation::open() {
     AvahiServerConfig config;
     avahi_server_config_init(&config);
     avahi_free(config.host_name);
@@ -167,17 +204,41 @@ std::string Announcer::Implementation::start() {
     if (m_loopbackOnly) {
         config.allow_interfaces = avahi_string_list_new("lo", nullptr);
     }
-    int error = AVAHI_ERR_NO_MEMORY;
-    if (m_poll) {
-        m_listeningPoll.emplace(*avahi_threaded_poll_get(m_poll.get()));
-        m_server.reset(avahi_server_new(&*m_listeningPoll, &config, onServer, this, &error));
-    }
+    int error = AVAHI_OK;
+    m_server.reset(avahi_server_new(&*m_listeningPoll, &config, onServer, this, &error));
     avahi_server_config_free(&config);
-    watchAddresses();
-    if (!m_server || avahi_threaded_poll_start(m_poll.get()) < 0) {
-        return std::string("cannot announce on the network: ") + avahi_strerror(error);
+    if (!m_server) {
+        retryLater(avahi_strerror(error));
     }
-    return {};
+}
+
+// The server cannot be freed in its own callback. A reason is said once, until sources are announced again.
+void Announcer::Implementation::retryLater(const std::string& reason) {
+    if (std::exchange(m_reported, reason) != reason) {
+        m_say("cannot announce on the network: " + reason +
+              "; it is tried again, the addresses above are served all the same");
+    }
+    if (m_retry != nullptr) {
+        return;
+    }
+    timeval when{};
+    avahi_elapse_time(&when, static_cast<unsigned>(m_retryPause.count()), 0);
+    m_retryPause = std::min(2 * m_retryPause, longestRetryPause);
+    const AvahiPoll* poll = avahi_threaded_poll_get(m_poll.get());
+    m_retry = poll->timeout_new(poll, &when, onRetry, this);
+}
+
+void Announcer::Implementation::onRetry(AvahiTimeout* timeout, void* data) {
+    auto& self = *static_cast<Implementation*>(data);
+    avahi_threaded_poll_get(self.m_poll.get())->timeout_free(timeout);
+    self.m_retry = nullptr;
+    self.m_hostGroup = nullptr;
+    for (const auto& entry : self.m_entries) {
+        entry->group = nullptr;
+        entry->attempt = 1;
+    }
+    self.m_server.reset();
+    self.open();
 }
 
 // Freeing the server sends the goodbyes of everything that is still registered.
@@ -186,6 +247,9 @@ Announcer::Implementation::~Implementation() {
         avahi_threaded_poll_stop(m_poll.get());
     }
     m_server.reset();
+    if (m_retry != nullptr) {
+        avahi_threaded_poll_get(m_poll.get())->timeout_free(m_retry);
+    }
     if (m_addressWatch != nullptr) {
         avahi_threaded_poll_get(m_poll.get())->watch_free(m_addressWatch);
     }
@@ -208,10 +272,19 @@ void Announcer::Implementation::onAddressNews(AvahiWatch*, int news, AvahiWatchE
     }
     auto& self = *static_cast<Implementation*>(data);
     AvahiServer* server = self.m_server.get();
-    if (avahi_server_get_state(server) == AVAHI_SERVER_RUNNING &&
-        !(localAddresses(self.m_loopbackOnly) == self.m_addresses)) {
+    if (server == nullptr || avahi_server_get_state(server) != AVAHI_SERVER_RUNNING) {
+        return;
+    }
+    if (!(localAddresses(self.m_loopbackOnly) == self.m_addresses)) {
         self.announceHost(server);
     }
+    // Also without another address: that an interface has come up or gone down decides, too, where others reach this
+    // machine.
+    self.renewTexts(server);
+}
+
+std::string Announcer::Implementation::host() const {
+    return m_loopbackOnly ? "127.0.0.1" : reachableAddress();
 }
 
 void Announcer::Implementation::onServer(AvahiServer* server, AvahiServerState state, void* self) {
@@ -221,6 +294,8 @@ void Announcer::Implementation::onServer(AvahiServer* server, AvahiServerState s
 void Announcer::Implementation::serverChanged(AvahiServer* server, AvahiServerState state) {
     switch (state) {
     case AVAHI_SERVER_RUNNING:
+        m_retryPause = firstRetryPause;
+        m_reported.clear();
         announceHost(server);
         announceAll(server);
         break;
@@ -228,7 +303,7 @@ void Announcer::Implementation::serverChanged(AvahiServer* server, AvahiServerSt
         takeNextHostName(server);
         break;
     case AVAHI_SERVER_FAILURE:
-        m_say(std::string("cannot announce on the network any more: ") + avahi_strerror(avahi_server_errno(server)));
+        retryLater(avahi_strerror(avahi_server_errno(server)));
         break;
     case AVAHI_SERVER_REGISTERING:
     case AVAHI_SERVER_INVALID:
@@ -267,8 +342,24 @@ void Announcer::Implementation::onHost(AvahiServer* server, AvahiSEntryGroup*, A
 
 // Also after the host's name has changed: the announcements name the host and are made anew.
 void Announcer::Implementation::announceAll(AvahiServer* server) {
+    m_host = host();
     for (const auto& entry : m_entries) {
         announce(server, *entry);
+    }
+}
+
+// In place: the source itself stays, nobody hears a goodbye.
+void Announcer::Implementation::renewTexts(AvahiServer* server) {
+    if (std::exchange(m_host, host()) == m_host) {
+        return;
+    }
+    for (const auto& entry : m_entries) {
+        if (entry->group != nullptr && namesThisMachine(entry->announcement)) {
+            const Strings strings = textRecords(entry->announcement, m_host);
+            avahi_server_update_service_txt_strlst(server, entry->group, AVAHI_IF_UNSPEC, AVAHI_PROTO_UNSPEC,
+                                                   static_cast<AvahiPublishFlags>(0), entry->name.c_str(), serviceType,
+                                                   nullptr, strings.get());
+        }
     }
 }
 
@@ -294,7 +385,7 @@ int Announcer::Implementation::tryName(AvahiServer* server, Entry& entry) {
     entry.name = entry.attempt == 1 ? instanceName(what.machine, what.source)
                                     : alternativeInstanceName(what.machine, what.source, entry.attempt);
     avahi_s_entry_group_reset(entry.group);
-    const Strings strings = textRecords(what);
+    const Strings strings = textRecords(what, m_host);
     const int result = avahi_server_add_service_strlst(server, entry.group, AVAHI_IF_UNSPEC, AVAHI_PROTO_UNSPEC,
                                                        static_cast<AvahiPublishFlags>(0), entry.name.c_str(),
                                                        serviceType, nullptr, nullptr, m_port, strings.get());

@@ -8,7 +8,8 @@
 
 namespace qivo {
 
-/** A source as the network hears of it. */
+/** A source as the network hears of it. An address that begins with ":" (":8080/path") leads to this machine: what
+ *  others reach it at goes before it, as it is at the time. */
 struct Announcement {
     std::string machine;
     std::string source;
@@ -19,7 +20,8 @@ struct Announcement {
 };
 
 /** Announces sources by multicast DNS as `_rtsp._tcp`, with a stack of its own that needs no daemon. It has a thread of
- *  its own, on which `say` is called with lines for the user. Destruction says goodbye to the network. */
+ *  its own, on which `say` is called with lines for the user. Where the network
+ *  cannot be used it is tried again with growing pauses. Destruction says goodbye to the network. */
 class Announcer {
   public:
     using Say = std::function<void(const std::string&)>;
@@ -29,7 +31,7 @@ class Announcer {
     Announcer(const Announcer&) = delete;
     Announcer& operator=(const Announcer&) = delete;
 
-    /** Begins. Empty, or one line that says why nothing can be announced. */
+    /** Begins. Empty, or one line that says why nothing will ever be announced. */
     [[nodiscard]] std::string start();
 
   private:

@@ -262,8 +262,10 @@ void Publisher::announce() {
     std::vector<Announcement> announcements;
     for (std::size_t i = 0; i < m_options.sources.size(); ++i) {
         const SourceOptions& source = m_options.sources[i];
-        announcements.push_back({m_options.machine, source.name, fullPath(i), lowPath(i), webAddress(i),
-                                 m_cameras[i] ? httpAddress(onvifPath(i)) : ""});
+        const std::string port = ":" + std::to_string(m_http.port());
+        announcements.push_back({m_options.machine, source.name, fullPath(i), lowPath(i),
+                                 source.web.empty() && m_cameras[i] ? port + webPath(i) : source.web,
+                                 m_cameras[i] ? port + onvifPath(i) : ""});
     }
     m_announcer = std::make_unique<Announcer>(std::move(announcements), static_cast<std::uint16_t>(m_server.port()),
                                               m_options.loopbackOnly, say);
