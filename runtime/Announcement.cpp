@@ -9,28 +9,6 @@
 namespace qivo::runtime {
 namespace {
 
-constexpr std::string_view kUrlPunctuation = "-._~:/?[]@!$&'()*+,;=";
-
-bool isDigit(char c) {
-    return c >= '0' && c <= '9';
-}
-
-bool isLetter(char c) {
-    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
-}
-
-bool isHexDigit(char c) {
-    return isDigit(c) || (c >= 'a' && c <= 'f') || (c >= 'A' && c <= 'F');
-}
-
-bool isUrlCharacter(char c) {
-    return isDigit(c) || isLetter(c) || kUrlPunctuation.find(c) != std::string_view::npos;
-}
-
-bool isEscape(std::string_view text, std::size_t at) {
-    return at + 2 < text.size() && text[at] == '%' && isHexDigit(text[at + 1]) && isHexDigit(text[at + 2]);
-}
-
 /// Takes one character off the front. Nothing if the text does not begin with a valid one; overlong forms, surrogates
 /// and what lies beyond U+10FFFF are not valid.
 std::optional<char32_t> takeCharacter(std::string_view& text) {
@@ -58,26 +36,6 @@ std::optional<char32_t> takeCharacter(std::string_view& text) {
     }
     text.remove_prefix(length);
     return character;
-}
-
-bool isPort(std::string_view text) {
-    return !text.empty() && text.size() <= 5 && std::all_of(text.begin(), text.end(), isDigit) &&
-           std::stoi(std::string(text)) > 0 && std::stoi(std::string(text)) <= 0xffff;
-}
-
-/// `text` is what follows "//" up to the path.
-bool isAuthority(std::string_view text) {
-    const auto login = text.rfind('@');
-    if (login != std::string_view::npos) {
-        text.remove_prefix(login + 1);
-    }
-    const auto hostEnd = !text.empty() && text.front() == '[' ? text.find(']') : text.find(':');
-    if (text.empty() || text.front() == ':' ||
-        (text.front() == '[' && (hostEnd == std::string_view::npos || hostEnd == 1))) {
-        return false;
-    }
-    const auto rest = text.front() == '[' ? text.substr(hostEnd + 1) : text.substr(std::min(hostEnd, text.size()));
-    return rest.empty() || (rest.front() == ':' && isPort(rest.substr(1)));
 }
 
 /// The value of the first string with that key; nothing if there is none.
@@ -124,7 +82,7 @@ std::string urlPath(std::string_view text) {
     constexpr std::string_view kHex = "0123456789ABCDEF";
     std::string path = text.empty() || text.front() != '/' ? "/" : "";
     for (std::size_t i = 0; i < text.size(); ++i) {
-        if (isUrlCharacter(text[i]) || isEscape(text, i)) {
+        if (isUrlCharacter(text[i]) || isUrlEscape(text, i)) {
             path += text[i];
             continue;
         }
@@ -132,21 +90,6 @@ std::string urlPath(std::string_view text) {
         path += {'%', kHex[byte >> 4U], kHex[byte & 0xfU]};
     }
     return path;
-}
-
-bool isWebAddress(std::string_view address) {
-    const std::string scheme = foldCase(address.substr(0, 8));
-    const std::size_t start = scheme == "https://" ? 8 : scheme.compare(0, 7, "http://") == 0 ? 7 : 0;
-    const auto valid = [&](std::size_t i) {
-        return isUrlCharacter(address[i]) || address[i] == '#' || isEscape(address, i);
-    };
-    for (std::size_t i = 0; i < address.size(); ++i) {
-        if (!valid(i)) {
-            return false;
-        }
-    }
-    const auto rest = address.substr(start);
-    return start > 0 && isAuthority(rest.substr(0, rest.find_first_of("/?#")));
 }
 
 std::optional<ServiceText> parseServiceText(const std::vector<std::string>& strings) {

@@ -6,6 +6,8 @@
 #include <string_view>
 #include <vector>
 
+#include "sdk/WebAddress.h"
+
 namespace qivo::runtime {
 
 /// Longest name in bytes: one label of the domain name system.
@@ -44,8 +46,7 @@ std::optional<ServiceText> parseServiceText(const std::vector<std::string>& stri
 /// Whether a source may have this name: valid UTF-8 without control characters, 1 to kMaxNameBytes bytes.
 bool isSourceName(std::string_view name);
 
-/// Whether this is an http or https address with a host and, if any, a valid port, in the characters of a URL.
-bool isWebAddress(std::string_view address);
+using qivo::isWebAddress;
 
 /// The text as a URL's path and query: leading slash, everything that a URL cannot hold percent-encoded. An escape
 /// that is already there stays. Empty text is "/".

@@ -214,6 +214,16 @@ TEST(Options, webAddressesAreHttpOrHttps) {
     EXPECT_EQ(refused({"--web", "http:///x"}), "--web \"http:///x\": the address has no host");
     EXPECT_EQ(refused({"--web", "http://a b"}),
               "--web: the address holds blanks, control or non-ASCII characters; percent-encode them");
+    // What viewers would drop without a word.
+    for (const char* web : {"http://a:0/", "http://a:65536/", "http://a:x/", "http://[]/", "http://[::1/", "http://@/",
+                            "http://a\\b/", "http://a/%zz", "http://a/\"", "http://a/{b}"}) {
+        EXPECT_EQ(refused({"--web", web}), "--web \"" + std::string(web) +
+                                               "\": not a web address that viewers take; check its host, its port and "
+                                               "its characters");
+    }
+    for (const char* web : {"http://[fe80::1]:80/", "http://user@camera/", "http://a/%20", "https://a?b#c"}) {
+        EXPECT_EQ(accepted({"--web", web}).sources[0].web, web);
+    }
 }
 
 TEST(Options, webAddressFitsItsRecord) {
@@ -224,7 +234,11 @@ TEST(Options, webAddressFitsItsRecord) {
 }
 
 TEST(Options, sourceNamesMustDiffer) {
-    EXPECT_EQ(refused({"--source", "A", "--source", "A"}), "--source \"A\" is given twice; names must differ");
+    EXPECT_EQ(refused({"--source", "A", "--source", "A"}),
+              "--source \"A\" is given twice; names must differ in more than capital letters");
+    EXPECT_EQ(refused({"--source", "Cam 1", "--source", "CAM 1"}),
+              "--source \"CAM 1\" is given twice; names must differ in more than capital letters");
+    EXPECT_EQ(accepted({"--source", "Cam 1", "--source", "Cam 2"}).sources.size(), 2U);
 }
 
 TEST(Options, sourcesAreBounded) {

@@ -3,6 +3,8 @@
 #include "tools/publish/Names.h"
 #include "tools/publish/Sound.h"
 
+#include "sdk/WebAddress.h"
+
 #include <algorithm>
 #include <charconv>
 #include <numeric>
@@ -166,6 +168,13 @@ Problem parseAudioCodec(const std::string& text, SoundCodec& codec) {
     return {};
 }
 
+// As names on the network are compared.
+std::string inLowerCase(std::string text) {
+    std::transform(text.begin(), text.end(), text.begin(),
+                   [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; });
+    return text;
+}
+
 bool startsWithAnyCase(std::string_view text, std::string_view start) {
     return text.size() >= start.size() && std::equal(start.begin(), start.end(), text.begin(), [](char a, char b) {
                return a == (b >= 'A' && b <= 'Z' ? b - 'A' + 'a' : b);
@@ -187,8 +196,11 @@ Problem checkWebAddress(const std::string& text) {
     if (!printable) {
         return "--web: the address holds blanks, control or non-ASCII characters; percent-encode them";
     }
-    if (text.size() == scheme || text[scheme] == '/' || text[scheme] == ':' || text[scheme] == '?') {
+    if (text.size() == scheme || std::string_view("/:?#").find(text[scheme]) != std::string_view::npos) {
         return start + "the address has no host";
+    }
+    if (!isWebAddress(text)) {
+        return start + "not a web address that viewers take; check its host, its port and its characters";
     }
     return {};
 }
@@ -371,8 +383,8 @@ Problem Reader::complete() {
         if (Problem problem = sourceProblem(m_options.machine, source); !problem.empty()) {
             return problem;
         }
-        if (!names.insert(source.name).second) {
-            return "--source \"" + source.name + "\" is given twice; names must differ";
+        if (!names.insert(inLowerCase(source.name)).second) {
+            return "--source \"" + source.name + "\" is given twice; names must differ in more than capital letters";
         }
     }
     return {};
