@@ -115,13 +115,14 @@ Publisher::Publisher(Options options) : m_options(std::move(options)) {}
 
 Publisher::~Publisher() = default;
 
-std::string Publisher::start() {
+std::string Publisher::examine() {
     if (std::string problem = missingElement(m_options.sources); !problem.empty()) {
         return problem;
     }
-    if (std::string problem = findInputs(); !problem.empty()) {
-        return problem;
-    }
+    return findInputs();
+}
+
+std::string Publisher::start() {
     if (m_options.login) {
         m_login = std::make_shared<HttpLogin>(*m_options.login);
         m_server.requireLogin(*m_options.login);

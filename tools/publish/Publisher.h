@@ -24,8 +24,12 @@ class Publisher {
     Publisher(const Publisher&) = delete;
     Publisher& operator=(const Publisher&) = delete;
 
-    /** Checks that everything is there, begins to serve, prints the addresses on standard output, then announces.
-     * Empty, or one line that says what is in the way; then nothing has begun. */
+    /** Checks that everything is there; comes before start() and takes up to ten seconds for each input. Empty, or one
+     * line that says what is in the way. */
+    [[nodiscard]] std::string examine();
+
+    /** Begins to serve, prints the addresses on standard output, then announces. Empty, or one line that says what is
+     * in the way; then nothing has begun. */
     [[nodiscard]] std::string start();
 
     /** Says goodbye to the network and to the viewers. */

@@ -24,16 +24,24 @@ gboolean quit(gpointer loop) {
     return G_SOURCE_CONTINUE;
 }
 
+// While inputs are examined, which takes seconds, nothing has begun that would have to be ended.
+void endAtOnce(int) {
+    _exit(0);
+}
+
 int fail(const std::string& text, int code) {
     std::fprintf(stderr, "qivo-publish: %s\n", text.c_str());
     return code;
 }
 
 int publish(const qivo::Options& options) {
+    qivo::Publisher publisher(options);
+    if (const std::string problem = publisher.examine(); !problem.empty()) {
+        return fail(problem, 1);
+    }
     GMainLoop* loop = g_main_loop_new(nullptr, FALSE);
     g_unix_signal_add(SIGINT, quit, loop);
     g_unix_signal_add(SIGTERM, quit, loop);
-    qivo::Publisher publisher(options);
     const std::string problem = publisher.start();
     if (problem.empty()) {
         g_main_loop_run(loop);
@@ -56,6 +64,8 @@ int main(int argc, char** argv) {
         std::fputs(answer->text.c_str(), stdout);
         return 0;
     }
+    std::signal(SIGINT, endAtOnce);
+    std::signal(SIGTERM, endAtOnce);
     gst_init(nullptr, nullptr);
     return publish(std::get<qivo::Options>(parsed));
 }
