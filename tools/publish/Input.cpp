@@ -143,6 +143,23 @@ std::string inputProblem(InputPlace& place) {
     return checkFile(place);
 }
 
+// A device takes the first that it can do, and of a range what is nearest to the very first. Many a device brings large
+// pictures at their full rate only as JPEG.
+std::string captureCaps(const PictureFormat& wanted) {
+    const std::string size =
+        ",width=" + std::to_string(wanted.size.width) + ",height=" + std::to_string(wanted.size.height);
+    const std::string rate = std::to_string(wanted.rate.numerator) + "/" + std::to_string(wanted.rate.denominator);
+    const std::string exact = ",framerate=" + rate;
+    const std::string atLeast = ",framerate=[" + rate + ",2147483647/1]";
+    std::string caps;
+    for (const std::string& demand : {size + exact, size + atLeast, atLeast, std::string()}) {
+        for (const char* kind : {"video/x-raw", "image/jpeg"}) {
+            caps += (caps.empty() ? "" : ";") + std::string(kind) + demand;
+        }
+    }
+    return caps;
+}
+
 std::vector<NeededElement> elementsFor(InputKind kind) {
     constexpr const char* base = "gstreamer1.0-plugins-base";
     constexpr const char* good = "gstreamer1.0-plugins-good";
@@ -151,6 +168,7 @@ std::vector<NeededElement> elementsFor(InputKind kind) {
                                         {"audioconvert", base}, {"audioresample", base}};
     if (kind == InputKind::device) {
         elements.push_back({"v4l2src", good});
+        elements.push_back({"jpegdec", good});
     } else if (kind == InputKind::stream) {
         elements.push_back({"rtspsrc", good});
     } else {
@@ -215,8 +233,6 @@ class InputPictureSource final : public PictureSource {
  */
 class InputSoundSource final : public SoundSource {
   public:
-    static constexpr std::chrono::milliseconds cushion{60};
-
     InputSoundSource(std::shared_ptr<Input> input, Input::Branch branch)
         : m_input(std::move(input)), m_slot(m_input->m_slots[static_cast<int>(branch)]) {
         const std::lock_guard lock(m_input->m_mutex);
@@ -226,32 +242,20 @@ class InputSoundSource final : public SoundSource {
     ~InputSoundSource() override {
         const std::lock_guard lock(m_input->m_mutex);
         --m_slot.listeners;
-        m_slot.sound.clear();
+        m_slot.sound->clear();
     }
 
     void fill(float* samples, std::size_t count) override {
         const auto channels = static_cast<std::size_t>(m_input->m_sound->channels);
         const std::lock_guard lock(m_input->m_mutex);
-        m_flowing = m_flowing || m_slot.sound.size() >= samplesIn(*m_input->m_sound, cushion);
-        const std::size_t there = m_flowing ? std::min(count * channels, m_slot.sound.size()) : 0;
-        const auto end = m_slot.sound.begin() + static_cast<std::ptrdiff_t>(there);
-        std::copy(m_slot.sound.begin(), end, samples);
-        m_slot.sound.erase(m_slot.sound.begin(), end);
-        std::fill(samples + there, samples + count * channels, 0.0F);
-        m_flowing = there == count * channels;
+        m_slot.sound->take(samples, count * channels);
     }
 
-    [[nodiscard]] std::chrono::nanoseconds age() const override { return cushion; }
-
-    /** In all channels together. */
-    static std::size_t samplesIn(const SoundFormat& format, std::chrono::milliseconds time) {
-        return static_cast<std::size_t>(format.rate * time.count() / 1000) * static_cast<std::size_t>(format.channels);
-    }
+    [[nodiscard]] std::chrono::nanoseconds age() const override { return SoundCushion::held; }
 
   private:
     std::shared_ptr<Input> m_input;
     Input::Slot& m_slot;
-    bool m_flowing = false;
 };
 
 Input::Input(InputPlace place, const PictureFormat& full, const PictureFormat& low, std::optional<SoundFormat> sound,
@@ -261,6 +265,9 @@ Input::Input(InputPlace place, const PictureFormat& full, const PictureFormat& l
     m_slots[0].format = full;
     m_slots[1].owner = this;
     m_slots[1].format = low;
+    for (Slot& slot : m_slots) {
+        slot.sound = sound ? std::optional(SoundCushion(*sound)) : std::nullopt;
+    }
 }
 
 Input::~Input() = default;
@@ -379,9 +386,11 @@ std::string Input::description() const {
                 " max-buffers=1 drop=true async=false sync=" + (live ? "false " : "true ");
     }
     // Sound is linked when it appears; other streams are left unlinked, which their demultiplexer bears.
-    const std::string start = m_place.kind == InputKind::device         ? "v4l2src name=in ! decodebin ! "
-                              : m_place.kind == InputKind::stillPicture ? "uridecodebin name=in ! imagefreeze ! "
-                                                                        : "uridecodebin name=in ! ";
+    const std::string start =
+        m_place.kind == InputKind::device
+            ? "v4l2src name=in ! capsfilter caps=\"" + captureCaps(m_slots[0].format) + "\" ! decodebin ! "
+        : m_place.kind == InputKind::stillPicture ? "uridecodebin name=in ! imagefreeze ! "
+                                                  : "uridecodebin name=in ! ";
     return start + text;
 }
 
@@ -466,7 +475,6 @@ void Input::onPadAdded(GstElement* decoder, GstPad* pad, gpointer data) {
 }
 
 GstFlowReturn Input::onSound(GstAppSink* sink, gpointer data) {
-    constexpr auto longest = 250ms;
     auto& input = *static_cast<Input*>(data);
     const Sample sample(gst_app_sink_pull_sample(sink));
     GstBuffer* buffer = sample ? gst_sample_get_buffer(sample.get()) : nullptr;
@@ -475,15 +483,11 @@ GstFlowReturn Input::onSound(GstAppSink* sink, gpointer data) {
         return GST_FLOW_EOS;
     }
     const auto* begin = reinterpret_cast<const float*>(map.data);
-    const std::size_t most = InputSoundSource::samplesIn(*input.m_sound, longest);
     {
         const std::lock_guard lock(input.m_mutex);
         for (Slot& slot : input.m_slots) {
             if (slot.listeners > 0) {
-                slot.sound.insert(slot.sound.end(), begin, begin + map.size / sizeof(float));
-            }
-            if (slot.sound.size() > most) {
-                slot.sound.erase(slot.sound.begin(), slot.sound.end() - static_cast<std::ptrdiff_t>(most));
+                slot.sound->add(begin, map.size / sizeof(float));
             }
         }
     }

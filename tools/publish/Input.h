@@ -3,11 +3,11 @@
 #include "tools/publish/NeededElement.h"
 #include "tools/publish/PictureSource.h"
 #include "tools/publish/Sound.h"
+#include "tools/publish/SoundCushion.h"
 
 #include <array>
 #include <chrono>
 #include <condition_variable>
-#include <deque>
 #include <functional>
 #include <gst/app/gstappsink.h>
 #include <memory>
@@ -38,6 +38,10 @@ struct InputPlace {
  * address is not tried, it may come up later. Tells still pictures from films, and whether there is sound, in `place`.
  * Empty, or one line that says what is wrong. Takes seconds at most; GStreamer must be initialised. */
 [[nodiscard]] std::string inputProblem(InputPlace& place);
+
+/** What a capture device is asked for, in the order of preference: pictures of the wanted size and rate, raw or as
+ *  JPEG, then faster ones, then those of another size, then whatever there is. As gst-launch takes it. */
+[[nodiscard]] std::string captureCaps(const PictureFormat& wanted);
 
 /** The elements that such an input needs, each with the Debian package that brings it. */
 [[nodiscard]] std::vector<NeededElement> elementsFor(InputKind kind);
@@ -77,10 +81,10 @@ class Input {
     struct Slot {
         Input* owner = nullptr;
         PictureFormat format;
-        int watchers = 0;        // under m_mutex
-        Picture newest;          // under m_mutex
-        int listeners = 0;       // under m_mutex
-        std::deque<float> sound; // under m_mutex; interleaved
+        int watchers = 0;                  // under m_mutex
+        Picture newest;                    // under m_mutex
+        int listeners = 0;                 // under m_mutex
+        std::optional<SoundCushion> sound; // under m_mutex
     };
 
     void watched(Branch branch);
