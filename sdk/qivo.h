@@ -18,9 +18,12 @@
  *   destroyed are taken back and their memory must no longer be read.
  *
  * Blocking
- *   Only QIVOlib_find_wait_for_sources and QIVOlib_recv_capture_v2 wait, at most for the time-out given, and with a
- *   time-out of 0 not at all. Creating and destroying a receiver returns within milliseconds whatever the network does.
- *   PTZ commands are queued and return at once.
+ *   QIVOlib_find_wait_for_sources and QIVOlib_recv_capture_v2 wait at most for the time-out given, and with a time-out
+ *   of 0 not at all. Creating and destroying a receiver returns within milliseconds whatever the network does. PTZ
+ *   commands are queued and return at once. The first QIVOlib_initialize loads what decodes, which takes seconds where
+ *   GStreamer has not been used before. QIVOlib_find_destroy, of the last finder where there is no receiver, waits for
+ *   the thread that looks for sources, milliseconds. The last QIVOlib_destroy waits for connections to be taken apart
+ *   and for cameras to be stopped, at most 3 seconds.
  *
  * Text
  *   Every string is UTF-8 and NUL-terminated.
@@ -89,9 +92,10 @@ enum QIVOlib_recv_color_format {
 
 /** How much of a source a receiver takes. */
 enum QIVOlib_recv_bandwidth {
-    QIVOlib_recv_bandwidth_lowest = 0,      /**< the source's low-bandwidth picture, where it offers one */
+    QIVOlib_recv_bandwidth_lowest = 0,      /**< the source's low-bandwidth picture, where it offers one, without sound */
     QIVOlib_recv_bandwidth_audio_only = 10, /**< sound without picture */
-    QIVOlib_recv_bandwidth_highest = 100    /**< the full picture */
+    QIVOlib_recv_bandwidth_highest = 100    /**< the full picture, without sound: this runtime brings sound to a
+                                                 receiver of its own, of bandwidth audio_only */
 };
 
 /** Settings of a receiver. A source is reached by its URL, by its name, or by both. */
@@ -99,7 +103,7 @@ typedef struct QIVOlib_recv_create_v3_t {
     QIVOlib_source_t source;      /**< the source; one of the two strings may be null */
     int32_t color_format;         /**< a QIVOlib_recv_color_format */
     int32_t bandwidth;            /**< a QIVOlib_recv_bandwidth */
-    bool allow_video_fields;      /**< false: every frame is progressive */
+    bool allow_video_fields;      /**< false: every frame is progressive. This runtime delivers no other */
     const char* p_qivo_recv_name; /**< what the receiver calls itself; null for the runtime's default */
 } QIVOlib_recv_create_v3_t;
 
