@@ -147,11 +147,23 @@ std::uint64_t Directory::generation() const {
 }
 
 bool Directory::waitForChange(std::uint64_t seen, std::chrono::milliseconds timeout) const {
+    return waitForChange(seen, timeout, false);
+}
+
+void Directory::wakeWaits() const {
+    // Whoever has looked and not yet begun to wait holds the lock.
+    { const std::lock_guard lock(m_core->mutex); }
+    m_core->changed.notify_all();
+}
+
+bool Directory::waitForChange(std::uint64_t seen, std::chrono::milliseconds timeout,
+                              const std::atomic<bool>& ended) const {
     std::unique_lock lock(m_core->mutex);
-    const auto differs = [this, seen] { return m_core->generation != seen; };
+    const auto differs = [&] { return m_core->generation != seen || ended; };
     // Bounded, because a time-out near the clock's end would overflow inside the wait.
     const auto bounded = std::min<std::chrono::milliseconds>(timeout, std::chrono::hours(24 * 365));
-    return m_core->changed.wait_until(lock, std::chrono::steady_clock::now() + bounded, differs);
+    return m_core->changed.wait_until(lock, std::chrono::steady_clock::now() + bounded, differs) &&
+           m_core->generation != seen;
 }
 
 Directory::Subscription Directory::subscribe(std::function<void()> changed) {

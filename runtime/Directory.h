@@ -1,5 +1,6 @@
 #pragma once
 
+#include <atomic>
 #include <chrono>
 #include <cstdint>
 #include <functional>
@@ -45,6 +46,12 @@ class Directory {
 
     /// Waits until `generation()` differs from `seen`, at most `timeout`. True if it does.
     bool waitForChange(std::uint64_t seen, std::chrono::milliseconds timeout) const;
+
+    /// The same, which also ends, with false, when `ended` has been set and `wakeWaits` was called since.
+    bool waitForChange(std::uint64_t seen, std::chrono::milliseconds timeout, const std::atomic<bool>& ended) const;
+
+    /// Makes every wait look whether it has ended.
+    void wakeWaits() const;
 
     /// Has `changed` called after every change, on the directory's thread and without its lock, for as long as the
     /// subscription lives. It must not block. Ending the subscription waits for a call of it that is running, except

@@ -40,8 +40,13 @@ std::vector<Finder::Entry> Finder::current() const {
     return entries;
 }
 
-bool Finder::report() {
+/// The generation was read before; what has changed since is compared again next time.
+bool Finder::report(std::uint64_t generation) {
     const std::lock_guard lock(m_mutex);
+    if (m_compared == generation && !m_unreported) {
+        return false;
+    }
+    m_compared = generation;
     auto now = current();
     if (now == m_reported && !m_unreported) {
         return false;
@@ -55,14 +60,22 @@ bool Finder::wait(std::chrono::milliseconds timeout) {
     const auto deadline = std::chrono::steady_clock::now() + timeout;
     while (true) {
         const auto seen = m_directory->generation();
-        if (report()) {
+        if (m_ended) {
+            return false;
+        }
+        if (report(seen)) {
             return true;
         }
         const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
-        if (left.count() <= 0 || !m_directory->waitForChange(seen, left)) {
+        if (left.count() <= 0 || !m_directory->waitForChange(seen, left, m_ended)) {
             return false;
         }
     }
+}
+
+void Finder::end() {
+    m_ended = true;
+    m_directory->wakeWaits();
 }
 
 const QIVOlib_source_t* Finder::sources(std::uint32_t* count) {

@@ -1,9 +1,11 @@
 #pragma once
 
+#include <atomic>
 #include <chrono>
 #include <cstdint>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -30,6 +32,9 @@ class Finder {
     /// null with 0 for none.
     const QIVOlib_source_t* sources(std::uint32_t* count);
 
+    /// Ends a wait that is going on, and every later one.
+    void end();
+
   private:
     struct Entry {
         std::string name;
@@ -37,14 +42,16 @@ class Finder {
         bool operator==(const Entry&) const = default;
     };
     std::vector<Entry> current() const;
-    bool report();
+    bool report(std::uint64_t generation);
 
     const std::shared_ptr<Directory> m_directory;
     const bool m_showLocalSources;
+    std::atomic<bool> m_ended = false;
 
     std::mutex m_mutex; // guards all below
     std::vector<Entry> m_reported;
-    bool m_unreported = false; // sources() handed out a list that wait() has not reported
+    std::optional<std::uint64_t> m_compared; // the directory's generation when m_reported was last compared with it
+    bool m_unreported = false;               // sources() handed out a list that wait() has not reported
     std::vector<Entry> m_entries;
     std::vector<QIVOlib_source_t> m_array; // points into m_entries
 };

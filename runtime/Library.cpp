@@ -7,15 +7,17 @@
 #include "runtime/Log.h"
 
 #include <string>
+#include <vector>
 
 namespace qivo::runtime {
 namespace {
 
 constexpr const char* kNeeded[] = {"rtspsrc", "queue", "capsfilter", "videoconvert", "fakesink"};
-constexpr const char* kUseful[] = {
-    "rtph264depay", "h264parse",    "avdec_h264",   "rtph265depay", "h265parse",    "avdec_h265",   "rtpjpegdepay",
-    "jpegdec",      "audioconvert", "rtpL16depay",  "rtpL24depay",  "rtppcmudepay", "mulawdec",     "rtppcmadepay",
-    "alawdec",      "rtpmp4gdepay", "rtpmp4adepay", "aacparse",     "avdec_aac",    "rtpopusdepay", "opusdec"};
+constexpr const char* kUseful[] = {"rtph264depay", "h264parse",    "avdec_h264",   "rtph265depay", "h265parse",
+                                   "avdec_h265",   "rtpjpegdepay", "jpegdec",      "audioconvert", "rtpL16depay",
+                                   "rtpL24depay",  "rtppcmudepay", "mulawdec",     "rtppcmadepay", "alawdec",
+                                   "deinterlace",  "rtpmp4gdepay", "rtpmp4adepay", "aacparse",     "avdec_aac",
+                                   "rtpopusdepay", "opusdec"};
 
 /// Whether the element can be made. Loads what makes it, so that the first receiver need not.
 bool canMake(const char* factory) {
@@ -64,11 +66,24 @@ bool Library::initialize() {
 
 void Library::destroy() {
     const std::lock_guard guard(m_mutex);
-    if (m_count == 0 || --m_count > 0) {
+    if (m_count == 0) {
         return;
     }
-    receivers.removeAll();
-    finders.removeAll();
+    std::vector<std::shared_ptr<Receiver>> endingReceivers;
+    std::vector<std::shared_ptr<Finder>> endingFinders;
+    {
+        const std::lock_guard admitting(m_admitting);
+        if (--m_count > 0) {
+            return;
+        }
+        endingReceivers = receivers.removeAll();
+        endingFinders = finders.removeAll();
+    }
+    for (const auto& finder : endingFinders) {
+        finder->end();
+    }
+    endingReceivers.clear();
+    endingFinders.clear();
     if (!BackgroundThreads::waitForAll(kEndLimit)) {
         log("a connection could not be taken apart in time");
     }

@@ -8,6 +8,7 @@
 #include <chrono>
 #include <memory>
 #include <mutex>
+#include <utility>
 
 namespace qivo::runtime {
 
@@ -25,12 +26,19 @@ class Library {
 
     /// Counts; false if GStreamer cannot run or lacks what every receiver needs.
     bool initialize();
-    /// Balances one `initialize`; the last ends everything that is open.
+    /// Balances one `initialize`; the last ends everything that is open, waits included.
     void destroy();
     bool isInitialized() const { return m_count > 0; }
 
     /// What a new receiver shares with the others.
     Receiver::Environment receiverEnvironment() const;
+
+    /// The handle of what was made just now; null where the last `destroy` has come first, which then would not see it.
+    template <typename Handle, typename Object, std::uint32_t Tag>
+    Handle admit(HandleRegistry<Handle, Object, Tag>& registry, std::shared_ptr<Object> object) {
+        const std::lock_guard guard(m_admitting);
+        return isInitialized() ? registry.add(std::move(object)) : nullptr;
+    }
 
     HandleRegistry<QIVOlib_recv_instance_t, Receiver, 0xF1520001> receivers;
     HandleRegistry<QIVOlib_find_instance_t, Finder, 0xF1520002> finders;
@@ -38,7 +46,8 @@ class Library {
   private:
     Library() = default;
 
-    std::mutex m_mutex; // serialises initialize and destroy
+    std::mutex m_mutex;     // serialises initialize and destroy
+    std::mutex m_admitting; // held while something is admitted, and while the last destroy takes all out
     std::atomic<int> m_count = 0;
     const std::shared_ptr<TransportMemory> m_transports = std::make_shared<TransportMemory>();
 };

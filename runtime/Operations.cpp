@@ -44,11 +44,13 @@ void QIVOlib_destroy(void) {
 
 QIVOlib_find_instance_t QIVOlib_find_create_v2(const QIVOlib_find_create_t* p_settings) {
     std::shared_ptr<Finder> finder = library().isInitialized() ? Finder::create(p_settings) : nullptr;
-    return finder ? library().finders.add(std::move(finder)) : nullptr;
+    return finder ? library().admit(library().finders, std::move(finder)) : nullptr;
 }
 
 void QIVOlib_find_destroy(QIVOlib_find_instance_t p_instance) {
-    library().finders.remove(p_instance);
+    if (const auto finder = library().finders.remove(p_instance)) {
+        finder->end();
+    }
 }
 
 bool QIVOlib_find_wait_for_sources(QIVOlib_find_instance_t p_instance, uint32_t timeout_in_ms) {
@@ -71,7 +73,7 @@ QIVOlib_recv_instance_t QIVOlib_recv_create_v3(const QIVOlib_recv_create_v3_t* p
         return nullptr;
     }
     std::shared_ptr<Receiver> created = Receiver::create(p_settings, library().receiverEnvironment());
-    return created ? library().receivers.add(std::move(created)) : nullptr;
+    return created ? library().admit(library().receivers, std::move(created)) : nullptr;
 }
 
 void QIVOlib_recv_destroy(QIVOlib_recv_instance_t p_instance) {

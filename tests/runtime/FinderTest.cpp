@@ -6,6 +6,7 @@
 #include <thread>
 
 #include "FinderResponder.h"
+#include "tests/audio/AllocationCount.h"
 
 namespace {
 
@@ -147,6 +148,26 @@ TEST_F(FinderTest, AWaitDoesNotHoldUpTheOtherOperations) {
     EXPECT_LT(std::chrono::steady_clock::now() - start, kDeadline / 2);
     m_responder.announce(source("ONE (a)", "host", "127.0.0.1"));
     waiter.join();
+}
+
+TEST_F(FinderTest, AWaitEndsWithItsFinder) {
+    std::thread waiter([&] { EXPECT_FALSE(m_first->wait(kDeadline)); });
+    const auto start = std::chrono::steady_clock::now();
+    m_first->end();
+    waiter.join();
+    EXPECT_LT(std::chrono::steady_clock::now() - start, kDeadline / 2);
+}
+
+TEST_F(FinderTest, AskingAgainWithoutNewsCopiesNothing) {
+    m_responder.announce(source("ONE (a)", "host", "127.0.0.1"));
+    ASSERT_TRUE(m_first->wait(kDeadline));
+    ASSERT_THAT(namesOf(*m_first), ElementsAre("ONE (a)"));
+    m_first->wait(0ms); // another control page or another address may have come since
+    const AllocationCount allocations;
+    for (int i = 0; i < 100; ++i) {
+        EXPECT_FALSE(m_first->wait(0ms));
+    }
+    EXPECT_EQ(allocations.soFar(), 0U);
 }
 
 TEST_F(FinderTest, AWaitEndsAtItsTimeOut) {

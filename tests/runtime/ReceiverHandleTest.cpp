@@ -8,11 +8,14 @@
 
 #include <algorithm>
 #include <array>
+#include <atomic>
 #include <chrono>
 #include <cstdio>
+#include <filesystem>
 #include <memory>
 #include <set>
 #include <string>
+#include <thread>
 #include <vector>
 
 namespace qivo::test {
@@ -122,6 +125,49 @@ TEST(Library, InitialisationsNest) {
     QIVOlib_destroy();
     expectRefused(receiver);
     EXPECT_EQ(receiveFrom("rtsp://127.0.0.1:9/"), nullptr);
+}
+
+TEST(Library, LastEndEndsAWaitForSources) {
+    ASSERT_TRUE(QIVOlib_initialize());
+    QIVOlib_find_instance_t const finder = QIVOlib_find_create_v2(nullptr);
+    ASSERT_NE(finder, nullptr);
+    std::thread waiting([finder] { EXPECT_FALSE(QIVOlib_find_wait_for_sources(finder, 60'000)); });
+    std::this_thread::sleep_for(100ms); // a wait that has not begun is refused, which is right as well
+    const auto before = Clock::now();
+    QIVOlib_destroy();
+    waiting.join();
+    EXPECT_LT(Clock::now() - before, 5s);
+}
+
+TEST(Library, NothingOutlivesALastEndThatItWasMadeBeside) {
+    const auto threads = [] {
+        const std::filesystem::directory_iterator all("/proc/self/task");
+        return std::distance(begin(all), end(all));
+    };
+    QIVOlib_recv_create_v3_t settings{};
+    settings.source.p_name = "NOWHERE (Cam 1)";
+    settings.color_format = QIVOlib_recv_color_format_rgba;
+    for (int round = 0; round < 40; ++round) {
+        const auto idle = threads();
+        ASSERT_TRUE(QIVOlib_initialize());
+        std::atomic<bool> going = false;
+        std::thread making([&] {
+            for (bool made = true; made;) {
+                made = QIVOlib_recv_create_v3(&settings) != nullptr;
+                going = true;
+            }
+        });
+        while (!going) {
+            std::this_thread::yield();
+        }
+        QIVOlib_destroy();
+        making.join();
+        const auto deadline = Clock::now() + 3s;
+        while (threads() > idle && Clock::now() < deadline) {
+            std::this_thread::sleep_for(1ms);
+        }
+        ASSERT_LE(threads(), idle) << "a receiver is still there, round " << round;
+    }
 }
 
 TEST_F(ReceiverHandles, NullIsRefused) {

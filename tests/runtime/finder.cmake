@@ -10,7 +10,7 @@ qivo_test(test-source-table SOURCES SourceTableTest.cpp LIBRARIES qivo_runtime_f
 qivo_test(test-log-once SOURCES LogOnceTest.cpp LIBRARIES qivo_runtime_finder)
 qivo_test(test-directory SOURCES DirectoryTest.cpp LIBRARIES qivo_runtime_finder qivo_finder_responder
           NETWORK TSAN TIMEOUT 120)
-qivo_test(test-finder SOURCES FinderTest.cpp LIBRARIES qivo_runtime_finder qivo_finder_responder
+qivo_test(test-finder SOURCES FinderTest.cpp LIBRARIES qivo_runtime_finder qivo_finder_responder qivo_allocation_count
           NETWORK TSAN TIMEOUT 120)
 qivo_test(test-finder-interfaces SOURCES FinderInterfacesTest.cpp LIBRARIES qivo_runtime_finder qivo_finder_responder
           NETWORK TSAN TIMEOUT 120)
