@@ -23,7 +23,8 @@ std::string pageOf(const std::string& address) {
 }
 
 ReceiverLoop::Clock::duration stallLimit(const RtspSession& session) {
-    return std::max<ReceiverLoop::Clock::duration>(kStallLimit, kStallIntervals * session.packetInterval());
+    return std::max<ReceiverLoop::Clock::duration>(session.paceKnown() ? kStallLimit : kFirstStallLimit,
+                                                   kStallIntervals * session.unitInterval());
 }
 
 } // namespace
@@ -163,8 +164,14 @@ void ReceiverLoop::pause() {
 
 ReceiverLoop::Outcome ReceiverLoop::attempt(const std::string& url, bool tcp) {
     const Media media = m_request.bandwidth == QIVOlib_recv_bandwidth_audio_only ? Media::audio : Media::video;
-    auto session = std::make_shared<RtspSession>(RtspSession::Settings{url, media, tcp}, m_mailbox, m_wakeup);
+    const auto stepLimit = std::chrono::duration_cast<std::chrono::milliseconds>(patient(kStepLimit));
+    const Clock::time_point began = Clock::now();
+    auto session =
+        std::make_shared<RtspSession>(RtspSession::Settings{url, media, tcp, stepLimit}, m_mailbox, m_wakeup);
     Outcome outcome = watch(*session, url, tcp);
+    outcome.described = session->described();
+    outcome.slow =
+        outcome.silent || (session->asked() && !session->playingSince() && Clock::now() - began >= stepLimit);
     end(std::move(session));
     m_mailbox->dropWaiting();
     return outcome;
@@ -182,13 +189,16 @@ ReceiverLoop::Outcome ReceiverLoop::watch(const RtspSession& session, const std:
             if (tcp) {
                 m_environment.transports->remember(sourceKey(url));
             }
+            if (session.playingSince().value_or(Clock::now()) - began < kStepLimit) {
+                m_patience = 0;
+            }
             m_mailbox->raiseStatus();
             steer(std::exchange(m_shown, true));
         }
-        if (auto outcome = judge(session, began, url)) {
+        if (auto outcome = judge(session, began, url, tcp)) {
             return *outcome;
         }
-        m_wakeup->wait(seen, nextLook(session, began));
+        m_wakeup->wait(seen, nextLook(session, began, tcp));
     }
     return {};
 }
@@ -217,7 +227,7 @@ void ReceiverLoop::end(std::shared_ptr<RtspSession> session) {
 
 /// What has come of an attempt; empty while it goes on.
 std::optional<ReceiverLoop::Outcome> ReceiverLoop::judge(const RtspSession& session, Clock::time_point began,
-                                                         const std::string& url) const {
+                                                         const std::string& url, bool tcp) const {
     const auto lastPacket = session.lastPacket();
     Outcome outcome;
     if (lastPacket) {
@@ -233,7 +243,7 @@ std::optional<ReceiverLoop::Outcome> ReceiverLoop::judge(const RtspSession& sess
             outcome.superseded = true;
             return outcome;
         }
-        return judgeSilence(session, began);
+        return judgeSilence(session, began, tcp);
     }
     if (Clock::now() - *lastPacket >= stallLimit(session)) {
         outcome.failure = broken("nothing comes any more");
@@ -242,19 +252,25 @@ std::optional<ReceiverLoop::Outcome> ReceiverLoop::judge(const RtspSession& sess
     return std::nullopt;
 }
 
-std::optional<ReceiverLoop::Outcome> ReceiverLoop::judgeSilence(const RtspSession& session,
-                                                                Clock::time_point began) const {
+/// A source that says that it is slow is given its time; elsewhere UDP that brings nothing is thought to be blocked.
+ReceiverLoop::Clock::duration ReceiverLoop::firstPacketLimit(const RtspSession& session, bool tcp) const {
+    return std::max<Clock::duration>(tcp ? patient(kTcpLimit) : Clock::duration(kUdpLimit),
+                                     kStallIntervals * session.unitInterval());
+}
+
+std::optional<ReceiverLoop::Outcome> ReceiverLoop::judgeSilence(const RtspSession& session, Clock::time_point began,
+                                                                bool tcp) const {
     const Clock::time_point now = Clock::now();
     Outcome outcome;
     if (const auto playing = session.playingSince()) {
-        if (now - *playing < kFirstPacketLimit) {
+        if (now - *playing < firstPacketLimit(session, tcp)) {
             return std::nullopt;
         }
         outcome.failure = broken("the server agreed to send, but nothing came");
         outcome.silent = true;
         return outcome;
     }
-    if (now - began < kHandshakeLimit) {
+    if (now - began < patient(kHandshakeLimit)) {
         return std::nullopt;
     }
     outcome.failure = broken("the server took too long to agree");
@@ -262,24 +278,31 @@ std::optional<ReceiverLoop::Outcome> ReceiverLoop::judgeSilence(const RtspSessio
 }
 
 /// When time alone can change the judgement.
-ReceiverLoop::Clock::time_point ReceiverLoop::nextLook(const RtspSession& session, Clock::time_point began) const {
+ReceiverLoop::Clock::time_point ReceiverLoop::nextLook(const RtspSession& session, Clock::time_point began,
+                                                       bool tcp) const {
     if (const auto lastPacket = session.lastPacket()) {
         return *lastPacket + stallLimit(session);
     }
     if (const auto playing = session.playingSince()) {
-        return *playing + kFirstPacketLimit;
+        return *playing + firstPacketLimit(session, tcp);
     }
-    return began + kHandshakeLimit;
+    return began + patient(kHandshakeLimit);
 }
 
 /// Decides when and how to try again.
 void ReceiverLoop::settle(const Outcome& outcome, const std::string& url, bool tcp) {
     report(outcome, url);
     const Clock::time_point next = m_backoff.attemptEnded(outcome.connected);
+    if (outcome.slow && (tcp || !outcome.silent)) {
+        m_patience = std::min(m_patience + 1, kMostPatience);
+    }
+    if (tcp && outcome.described && outcome.connected == Clock::duration{}) {
+        m_environment.transports->forget(sourceKey(url));
+    }
     if (outcome.silent && !tcp) {
         m_nextTcp = true;
         m_nextAttempt = Clock::now();
-    } else if (outcome.failure.kind == RtspSession::Failure::Kind::noTransport) {
+    } else if (outcome.failure.kind == RtspSession::Failure::Kind::noTransport && !tcp) {
         m_environment.transports->remember(sourceKey(url));
         m_nextAttempt = next;
     } else if (outcome.failure.kind == RtspSession::Failure::Kind::noStream) {

@@ -16,14 +16,21 @@
 
 namespace qivo::runtime {
 
-/// How long a stream may bring nothing before UDP is given up for TCP, and TCP for a new attempt.
-inline constexpr std::chrono::milliseconds kFirstPacketLimit{1000};
+/// How long a stream may bring nothing over UDP before it is given up for TCP.
+inline constexpr std::chrono::milliseconds kUdpLimit{1000};
+/// The same over TCP, where nothing is lost and it can only be the source that takes its time, before a new attempt.
+inline constexpr std::chrono::milliseconds kTcpLimit{3000};
 /// How long a connected stream may bring nothing before it is made anew.
 inline constexpr std::chrono::milliseconds kStallLimit{1500};
-/// Packet intervals that a source with a slow rate may be silent.
+/// The same before its second picture, when it is not known how long it takes from one to the next.
+inline constexpr std::chrono::milliseconds kFirstStallLimit{3000};
+/// Intervals from picture to picture that a source with a slow rate may be silent, here and above.
 inline constexpr int kStallIntervals = 3;
 /// The longest time from the beginning of an attempt to the server's consent to send.
 inline constexpr std::chrono::milliseconds kHandshakeLimit{5000};
+/// How often the limits for a server's answers and first packet over TCP double, each time that they turned out too
+/// short for a server that can be reached.
+inline constexpr int kMostPatience = 2;
 /// How long to leave a source in peace that answered and has nothing that could be received.
 inline constexpr std::chrono::milliseconds kNoStreamPause{5000};
 
@@ -60,6 +67,8 @@ class ReceiverLoop {
         RtspSession::Failure failure;
         Clock::duration connected{}; ///< how long packets came; 0 if none did
         bool silent = false;         ///< the server agreed to send, and nothing came
+        bool slow = false;           ///< the server was reached and took all the time that it had
+        bool described = false;      ///< the server described its streams
         bool superseded = false;     ///< the source is announced at another address
     };
 
@@ -70,9 +79,12 @@ class ReceiverLoop {
     Outcome attempt(const std::string& url, bool tcp);
     Outcome watch(const RtspSession& session, const std::string& url, bool tcp);
     void end(std::shared_ptr<RtspSession> session);
-    std::optional<Outcome> judge(const RtspSession& session, Clock::time_point began, const std::string& url) const;
-    std::optional<Outcome> judgeSilence(const RtspSession& session, Clock::time_point began) const;
-    Clock::time_point nextLook(const RtspSession& session, Clock::time_point began) const;
+    std::optional<Outcome> judge(const RtspSession& session, Clock::time_point began, const std::string& url,
+                                 bool tcp) const;
+    std::optional<Outcome> judgeSilence(const RtspSession& session, Clock::time_point began, bool tcp) const;
+    Clock::time_point nextLook(const RtspSession& session, Clock::time_point began, bool tcp) const;
+    Clock::duration firstPacketLimit(const RtspSession& session, bool tcp) const;
+    Clock::duration patient(Clock::duration limit) const { return limit * (1 << m_patience); }
     void settle(const Outcome& outcome, const std::string& url, bool tcp);
     void pause();
     void report(const Outcome& outcome, const std::string& url);
@@ -93,6 +105,7 @@ class ReceiverLoop {
     bool m_first = true;    ///< no attempt has been made
     bool m_nextTcp = false; ///< the last attempt got consent over UDP and nothing more
     bool m_shown = false;   ///< the source has been connected
+    int m_patience = 0;     ///< how often the limits have been doubled
     bool m_hurry = false;   ///< the source has been announced, or announced differently, since the last attempt
     std::string m_reported; ///< the failure that was last logged
 

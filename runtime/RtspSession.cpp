@@ -64,7 +64,11 @@ std::string textField(const GstStructure* structure, const char* name) {
 bool isWanted(const GstStructure* rtp, Media media) {
     const std::string kind = textField(rtp, "media");
     if (media == Media::video) {
-        return kind == "video" && codecFor(encodingOf(rtp)) != nullptr;
+        const bool known = codecFor(encodingOf(rtp)) != nullptr;
+        if (kind == "video" && !known) {
+            logOnce("video in " + encodingOf(rtp) + " is not received, only H.264, H.265 and JPEG");
+        }
+        return kind == "video" && known;
     }
     if (kind != "audio") {
         return false;
@@ -164,16 +168,23 @@ struct RtspSession::Callbacks {
     static gboolean selectStream(GstElement*, guint, GstCaps* caps, gpointer data) {
         RtspSession& session = self(data);
         session.m_described = true;
-        if (session.m_selected || !isWanted(gst_caps_get_structure(caps, 0), session.m_settings.media)) {
+        const GstStructure* rtp = gst_caps_get_structure(caps, 0);
+        if (session.m_selected || !isWanted(rtp, session.m_settings.media)) {
             return FALSE;
         }
         session.m_selected = true;
+        session.readRate(rtp);
         return TRUE;
     }
 
     /// An answer that it cannot read makes the source ask again without end, and open sockets each time.
-    static gboolean beforeSend(GstElement*, GstRTSPMessage* message, gpointer data) {
+    static gboolean beforeSend(GstElement* source, GstRTSPMessage* message, gpointer data) {
         RtspSession& session = self(data);
+        if (session.m_requests == 0) {
+            // The connection stands: from here on it is the server that takes its time.
+            const guint64 limit = std::chrono::microseconds(session.m_settings.stepLimit).count();
+            g_object_set(source, "tcp-timeout", limit, nullptr);
+        }
         if (session.playingSince() || message->type != GST_RTSP_MESSAGE_REQUEST) {
             return TRUE;
         }
@@ -206,7 +217,21 @@ struct RtspSession::Callbacks {
     }
 
     static GstPadProbeReturn unitComplete(GstPad*, GstPadProbeInfo*, gpointer data) {
-        self(data).m_unitBytes = 0;
+        self(data).unitComplete();
+        return GST_PAD_PROBE_OK;
+    }
+
+    /// The decoder tells what its pictures are like.
+    static GstPadProbeReturn decoded(GstPad* pad, GstPadProbeInfo* info, gpointer data) {
+        GstEvent* event = GST_PAD_PROBE_INFO_EVENT(info);
+        GstCaps* caps = nullptr;
+        if (GST_EVENT_TYPE(event) == GST_EVENT_CAPS) {
+            gst_event_parse_caps(event, &caps);
+            const std::string mode = textField(gst_caps_get_structure(caps, 0), "interlace-mode");
+            if (!mode.empty() && mode != "progressive" && !self(data).m_deinterlacing) {
+                self(data).deinterlace(pad, caps);
+            }
+        }
         return GST_PAD_PROBE_OK;
     }
 
@@ -344,6 +369,23 @@ void RtspSession::packetArrived() {
     }
 }
 
+void RtspSession::readRate(const GstStructure* rtp) {
+    const double rate = g_ascii_strtod(textField(rtp, "a-framerate").c_str(), nullptr);
+    if (rate > 0.0) {
+        const std::chrono::duration<double> interval(std::min(1.0 / rate, kLongestInterval));
+        m_saidInterval = std::chrono::duration_cast<Clock::duration>(interval).count();
+    }
+}
+
+void RtspSession::unitComplete() {
+    m_unitBytes = 0;
+    m_lastUnit = nowTicks();
+    if (m_units == 0) {
+        m_firstUnit = m_lastUnit.load();
+    }
+    ++m_units;
+}
+
 void RtspSession::addBranch(GstPad* pad) {
     const GstOwned<GstCaps> caps(gst_pad_get_current_caps(pad));
     const GstStructure* rtp = caps && !gst_caps_is_empty(caps.get()) ? gst_caps_get_structure(caps.get(), 0) : nullptr;
@@ -352,11 +394,6 @@ void RtspSession::addBranch(GstPad* pad) {
         return;
     }
     m_linked = true;
-    const double rate = g_ascii_strtod(textField(rtp, "a-framerate").c_str(), nullptr);
-    if (rate > 0.0) {
-        const std::chrono::duration<double> interval(std::min(1.0 / rate, kLongestInterval));
-        m_packetInterval = std::chrono::duration_cast<Clock::duration>(interval).count();
-    }
     gst_pad_add_probe(pad, kDataProbe, Callbacks::packet, this, nullptr);
     const std::string encoding = encodingOf(rtp);
     if (m_settings.media == Media::video ? !addVideo(pad, encoding) : !addAudio(pad, encoding)) {
@@ -375,7 +412,7 @@ bool RtspSession::addAudio(GstPad* pad, const std::string& encoding) {
             m_mailbox->offer(std::move(sound));
         }
     };
-    calls.unitComplete = [this] { m_unitBytes = 0; };
+    calls.unitComplete = [this] { unitComplete(); };
     calls.refused = [this](std::string problem) { fail(Failure::Kind::noStream, std::move(problem)); };
     m_sound = std::make_unique<SoundBranch>(std::move(calls), m_clock);
     return m_sound->build(GST_BIN(m_pipeline.get()), pad, encoding);
@@ -393,16 +430,43 @@ bool RtspSession::addVideo(GstPad* pad, const std::string& encoding) {
         chain.push_back(makeFilter(parsed.get()));
     }
     GstElement* queue = makeQueue();
+    GstElement* bounded = makeFilter(decoded.get());
     GstElement* converter = makeConverter();
     GstElement* sink = makeSink();
-    chain.insert(chain.end(), {queue, makeDecoder(codec.decoder), makeFilter(decoded.get()), converter,
-                               makeFilter(rgba.get()), sink});
-    if (queue != nullptr && converter != nullptr && sink != nullptr) {
+    chain.insert(chain.end(), {queue, makeDecoder(codec.decoder), bounded, converter, makeFilter(rgba.get()), sink});
+    if (queue != nullptr && bounded != nullptr && converter != nullptr && sink != nullptr) {
+        const GstOwned<GstPad> pictures(gst_element_get_static_pad(bounded, "src"));
+        gst_pad_add_probe(pictures.get(), GST_PAD_PROBE_TYPE_EVENT_DOWNSTREAM, Callbacks::decoded, this, nullptr);
         watchInput(queue, kDataProbe, Callbacks::unitComplete, this);
         watchInput(converter, kDataProbe, Callbacks::makeRoom, this);
         watchInput(sink, GST_PAD_PROBE_TYPE_BUFFER, Callbacks::handOn, this);
     }
     return appendChain(GST_BIN(m_pipeline.get()), pad, chain);
+}
+
+/// Makes one whole picture of each pair of fields, without waiting for later ones. Progressive streams, which most are,
+/// never meet the element; where they follow on interlaced pictures they pass it untouched.
+void RtspSession::deinterlace(GstPad* decoded, GstCaps* caps) {
+    m_deinterlacing = true;
+    GstElement* element = makeElement("deinterlace");
+    if (element == nullptr) {
+        return;
+    }
+    gst_util_set_object_arg(G_OBJECT(element), "method", "vfir");
+    gst_util_set_object_arg(G_OBJECT(element), "fields", "top");
+    gst_bin_add(GST_BIN(m_pipeline.get()), element);
+    const GstOwned<GstPad> in(gst_element_get_static_pad(element, "sink"));
+    const GstOwned<GstPad> out(gst_element_get_static_pad(element, "src"));
+    if (gst_pad_query_accept_caps(in.get(), caps) == FALSE) {
+        logOnce("interlaced pictures of this kind are shown as they are");
+        gst_bin_remove(GST_BIN(m_pipeline.get()), element);
+        return;
+    }
+    const GstOwned<GstPad> next(gst_pad_get_peer(decoded));
+    gst_pad_unlink(decoded, next.get());
+    gst_pad_link(decoded, in.get());
+    gst_pad_link(out.get(), next.get());
+    gst_element_sync_state_with_parent(element);
 }
 
 std::optional<RtspSession::Failure> RtspSession::failure() const {
@@ -418,8 +482,10 @@ std::optional<RtspSession::Clock::time_point> RtspSession::lastPacket() const {
     return timeOf(m_lastPacket);
 }
 
-RtspSession::Clock::duration RtspSession::packetInterval() const {
-    return Clock::duration(m_packetInterval.load());
+RtspSession::Clock::duration RtspSession::unitInterval() const {
+    const std::int64_t units = m_units;
+    const std::int64_t seen = units > 1 ? (m_lastUnit - m_firstUnit) / (units - 1) : 0;
+    return Clock::duration(std::max<std::int64_t>(m_saidInterval, seen));
 }
 
 } // namespace qivo::runtime

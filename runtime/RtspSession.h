@@ -19,7 +19,7 @@ namespace qivo::runtime {
 inline constexpr unsigned kJitterBufferMs = 40;
 /// The longest side of a picture that is decoded, in pixels.
 inline constexpr int kLargestSide = 8192;
-/// The longest time that one step of the handshake may take.
+/// The longest time that connecting and each answer of the handshake may take, where a source is not known to be slow.
 inline constexpr std::chrono::milliseconds kStepLimit{1500};
 
 /// Which streams of a source are set up; never more than one.
@@ -38,6 +38,8 @@ class RtspSession {
         std::string url;
         Media media = Media::video;
         bool tcpOnly = false;
+        /// The longest time that an answer may take, once the connection stands.
+        std::chrono::milliseconds stepLimit = kStepLimit;
     };
 
     struct Failure {
@@ -61,12 +63,19 @@ class RtspSession {
 
     /// Why the session has ended; empty while it goes on.
     std::optional<Failure> failure() const;
+    /// Whether a connection stood, so that the server was asked.
+    bool asked() const { return m_requests > 0; }
+    /// Whether the server has described its streams.
+    bool described() const { return m_described; }
     /// When the server agreed to send; empty before.
     std::optional<Clock::time_point> playingSince() const;
     /// When the last packet of a wanted stream arrived; empty before the first.
     std::optional<Clock::time_point> lastPacket() const;
-    /// How long the source may take from one packet to the next, by what it says about its rate.
-    Clock::duration packetInterval() const;
+    /// How long the source takes from one picture or unit of sound to the next: by what it says about its rate, or by
+    /// what came of it if that is longer. 0 if neither tells.
+    Clock::duration unitInterval() const;
+    /// Whether enough has come to tell how long the source takes.
+    bool paceKnown() const { return m_units > 1; }
 
   private:
     struct Callbacks;
@@ -75,9 +84,12 @@ class RtspSession {
     void fail(Failure::Kind kind, std::string reason);
     Failure::Kind unselectedKind() const;
     void progress(GstMessage* message);
+    void readRate(const GstStructure* rtp);
     void packetArrived();
+    void unitComplete();
     void addBranch(GstPad* pad);
     bool addVideo(GstPad* pad, const std::string& encoding);
+    void deinterlace(GstPad* decoded, GstCaps* caps);
     bool addAudio(GstPad* pad, const std::string& encoding);
     void addSink(GstPad* pad);
 
@@ -95,12 +107,16 @@ class RtspSession {
     std::atomic<bool> m_described = false; // the server has described its streams
     std::atomic<bool> m_linked = false;    // the chosen stream's branch has been built
     std::atomic<bool> m_making = false;    // the mailbox expects a picture; the decoder's thread
-    int m_requests = 0;                    // sent before the server agreed; the source's thread, here and below
-    int m_setups = 0;                      // those of them that set a stream up
+    bool m_deinterlacing = false;          // from the first interlaced picture on; the decoder's thread
+    std::atomic<int> m_requests = 0;       // sent before the server agreed; counted on the source's thread
+    int m_setups = 0;                      // those of them that set a stream up; the source's thread
     std::size_t m_unitBytes = 0; // received since the last complete picture or unit of sound; the network's thread
     std::atomic<std::int64_t> m_playingSince = 0; // Clock's count; 0 means not yet, here and below
     std::atomic<std::int64_t> m_lastPacket = 0;
-    std::atomic<std::int64_t> m_packetInterval = 0;
+    std::atomic<std::int64_t> m_saidInterval = 0;
+    std::atomic<std::int64_t> m_firstUnit = 0;
+    std::atomic<std::int64_t> m_lastUnit = 0;
+    std::atomic<std::int64_t> m_units = 0; // complete ones so far
 
     mutable std::mutex m_mutex; // protects the rest
     std::optional<Failure> m_failure;

@@ -96,7 +96,9 @@ TEST_F(ReceiverHealing, TakesTcpAtOnceWhereUdpIsRefused) {
 TEST_F(ReceiverHealing, SourceThatStallsIsReconnected) {
     RtspServer server({.launch = kPicture});
     const auto receiver = receive(server.url());
-    ASSERT_TRUE(nextPicture(*receiver));
+    for (int i = 0; i < 5; ++i) {
+        ASSERT_TRUE(nextPicture(*receiver));
+    }
     ASSERT_EQ(m_statusChanges, 1);
     const int connections = server.connections();
     server.setSilent(true);
@@ -111,6 +113,91 @@ TEST_F(ReceiverHealing, SourceThatStallsIsReconnected) {
     ASSERT_TRUE(nextPicture(*receiver));
     EXPECT_LT(Clock::now() - returned, 2s);
     EXPECT_GE(m_statusChanges, 2);
+}
+
+TEST_F(ReceiverHealing, SourceThatIsReachedOverUdpAgainIsNoLongerTakenOverTcp) {
+    const RtspServer server({.launch = kPicture});
+    const RtspServer other({.launch = kOtherPicture, .udpOnly = true});
+    RawServer wall;
+    wall.forwardTo(server.port(), withoutUdp());
+    const auto receiver = receive(wall.url());
+    ASSERT_TRUE(nextPicture(*receiver));
+    wall.forwardTo(other.port());
+    wall.closeAll();
+    const auto changed = Clock::now();
+    ASSERT_TRUE(pictureThat(*receiver, isOther));
+    EXPECT_LT(Clock::now() - changed, 2s);
+}
+
+// --- Sources that conform and take their time
+
+TEST_F(ReceiverHealing, ServerThatThinksForTwoSecondsIsShown) {
+    const RtspServer server({.launch = kPicture});
+    RawServer slow;
+    slow.forwardTo(server.port(), [](std::string bytes) {
+        if (bytes.rfind("DESCRIBE", 0) == 0) {
+            std::this_thread::sleep_for(2s); // the server that is simulated
+        }
+        return bytes;
+    });
+    const auto receiver = receive(slow.url());
+    EXPECT_TRUE(nextPicture(*receiver, 12s));
+    slow.closeAll();
+    ASSERT_TRUE(statusChanges(*receiver, 12s)) << "not connected again";
+    EXPECT_TRUE(nextPicture(*receiver, 2s));
+}
+
+TEST_F(ReceiverHealing, SourceThatBeginsLateIsShown) {
+    RtspServer server({.launch = kPicture});
+    std::atomic<Clock::rep> played = Clock::now().time_since_epoch().count();
+    std::atomic<bool> ended = false;
+    RawServer slow;
+    slow.forwardTo(server.port(), [&](std::string bytes) {
+        if (bytes.rfind("PLAY", 0) == 0) {
+            server.setSilent(true);
+            played = Clock::now().time_since_epoch().count();
+        }
+        return bytes;
+    });
+    std::thread beginning([&] {
+        while (!ended) {
+            server.setSilent(Clock::now() - Clock::time_point(Clock::duration(played)) < 1500ms);
+            std::this_thread::sleep_for(5ms);
+        }
+    });
+    const auto receiver = receive(slow.url());
+    EXPECT_TRUE(nextPicture(*receiver, 10s));
+    ended = true;
+    beginning.join();
+}
+
+/// A picture every two seconds, each whole in itself.
+std::string rarePictures(const std::string& beforePayloader) {
+    return "videotestsrc is-live=true do-timestamp=true ! video/x-raw,format=I420,width=320,height=240,framerate=1/2 ! "
+           "x264enc tune=zerolatency speed-preset=ultrafast key-int-max=1 bitrate=4000 ! " +
+           beforePayloader + "rtph264pay name=pay0 pt=96 config-interval=-1";
+}
+
+TEST_F(ReceiverHealing, SourceThatSaysThatItIsSlowIsGivenItsTime) {
+    const RtspServer server({.launch = rarePictures("")});
+    const auto receiver = receive(server.url());
+    for (int i = 0; i < 3; ++i) {
+        ASSERT_TRUE(nextPicture(*receiver, 8s)) << i;
+    }
+    EXPECT_EQ(server.connections(), 1);
+    EXPECT_EQ(server.tcpSetups(), 0) << "UDP was given up although nothing was due";
+}
+
+TEST_F(ReceiverHealing, SourceThatIsSlowWithoutSayingSoStaysConnected) {
+    // A rate of 0 means that none is told.
+    const RtspServer server({.launch = rarePictures("capssetter caps=\"video/x-h264,framerate=(fraction)0/1\" ! ")});
+    const auto receiver = receive(server.url());
+    ASSERT_TRUE(nextPicture(*receiver, 10s));
+    const int connections = server.connections();
+    for (int i = 0; i < 3; ++i) {
+        ASSERT_TRUE(nextPicture(*receiver, 8s)) << i;
+    }
+    EXPECT_EQ(server.connections(), connections);
 }
 
 class Transport : public ReceiverHealing, public testing::WithParamInterface<bool> {};

@@ -103,18 +103,25 @@ TEST_F(ReceiverStreams, AspectRatioIsThePixelsTimesTheSize) {
     EXPECT_NEAR(shot.record.picture_aspect_ratio, 320.0 * 16 / (240.0 * 11), 1e-5);
 }
 
-TEST_F(ReceiverStreams, SizeMayChangeInMidStream) {
-    RtspServer server({.launch = h264("width=320,height=240,framerate=30/1")});
+class SizeChange : public ReceiverFixture, public testing::WithParamInterface<const char*> {};
+
+TEST_P(SizeChange, MayComeInMidStream) {
+    const std::string caps = "width=320,height=240,framerate=30/1";
+    const std::string codec = GetParam();
+    RtspServer server({.launch = codec == "h264" ? h264(caps) : codec == "h265" ? h265(caps) : jpeg(caps)});
     const auto receiver = receive(server.url());
     ASSERT_TRUE(nextPicture(*receiver));
-    server.set("size", "caps", "video/x-raw,format=I420,width=638,height=360,framerate=30/1");
-    const Shot shot = pictureThat(*receiver, [](const Shot& s) { return s.record.xres == 638; });
+    server.set("size", "caps", "video/x-raw,format=I420,width=648,height=360,framerate=30/1");
+    const Shot shot = pictureThat(*receiver, [](const Shot& s) { return s.record.xres == 648; });
     ASSERT_TRUE(shot);
     EXPECT_EQ(shot.record.yres, 360);
-    EXPECT_GE(shot.record.line_stride_in_bytes, 638 * 4);
-    EXPECT_NEAR(shot.record.picture_aspect_ratio, 638.0 / 360.0, 1e-5);
+    EXPECT_GE(shot.record.line_stride_in_bytes, 648 * 4);
+    EXPECT_NEAR(shot.record.picture_aspect_ratio, 648.0 / 360.0, 1e-5);
     EXPECT_EQ(server.connections(), 1) << "the size changed by a reconnection";
 }
+
+INSTANTIATE_TEST_SUITE_P(Receiver, SizeChange, testing::Values("h264", "h265", "jpeg"),
+                         [](const auto& test) { return std::string(test.param); });
 
 TEST_F(ReceiverStreams, OddSizesHaveTheirOwnRows) {
     const RtspServer server({.launch = h264("width=322,height=242,framerate=30/1", "white")});
@@ -124,6 +131,26 @@ TEST_F(ReceiverStreams, OddSizesHaveTheirOwnRows) {
     EXPECT_EQ(shot.record.xres, 322);
     EXPECT_EQ(shot.record.yres, 242);
     EXPECT_TRUE(near(shot.pixel(321, 241), 0xffffff, 4));
+}
+
+/// Interlaced pictures: of each the one field is white, the other black.
+TEST_F(ReceiverStreams, InterlacedPicturesAreDeliveredWhole) {
+    const RtspServer server(
+        {.launch = "videotestsrc is-live=true do-timestamp=true pattern=blink ! "
+                   "video/x-raw,format=I420,width=320,height=240,framerate=50/1 ! interlace field-pattern=1:1 "
+                   "top-field-first=true ! x264enc interlaced=true tune=zerolatency speed-preset=ultrafast "
+                   "key-int-max=15 bitrate=4000 ! rtph264pay name=pay0 pt=96 config-interval=-1"});
+    const auto receiver = receive(server.url());
+    for (int i = 0; i < 10; ++i) {
+        const Shot shot = nextPicture(*receiver);
+        ASSERT_TRUE(shot);
+        EXPECT_EQ(shot.record.frame_format_type, 1);
+        EXPECT_EQ(shot.record.frame_rate_N, 25 * shot.record.frame_rate_D);
+        for (int y = 100; y < 110; ++y) {
+            EXPECT_TRUE(near(shot.pixel(160, y), shot.pixel(160, y + 1), 24))
+                << std::hex << shot.pixel(160, y) << " above " << shot.pixel(160, y + 1);
+        }
+    }
 }
 
 // --- Time

@@ -139,8 +139,9 @@ void RtspServer::addFactory(const std::string& path, const std::string& launch) 
     gst_rtsp_media_factory_set_shared(factory, TRUE);
     gst_rtsp_media_factory_set_latency(factory, 0);
     gst_rtsp_media_factory_set_protocols(
-        factory, m_options.tcpOnly
-                     ? GST_RTSP_LOWER_TRANS_TCP
+        factory, m_options.tcpOnly ? GST_RTSP_LOWER_TRANS_TCP
+                 : m_options.udpOnly
+                     ? GST_RTSP_LOWER_TRANS_UDP
                      : static_cast<GstRTSPLowerTrans>(GST_RTSP_LOWER_TRANS_TCP | GST_RTSP_LOWER_TRANS_UDP));
     if (!m_options.user.empty()) {
         GstRTSPPermissions* permissions = gst_rtsp_permissions_new();

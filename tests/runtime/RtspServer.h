@@ -24,6 +24,7 @@ class RtspServer {
         std::string lowPath = "/low";
         int port = 0;          ///< 0: any
         bool tcpOnly = false;  ///< refuses UDP in SETUP
+        bool udpOnly = false;  ///< refuses TCP in SETUP
         std::string user = {}; ///< with a password: asks for a login
         std::string password = {};
         std::string address = "127.0.0.1";
