@@ -92,7 +92,7 @@ enum QIVOlib_recv_color_format {
 
 /** How much of a source a receiver takes. */
 enum QIVOlib_recv_bandwidth {
-    QIVOlib_recv_bandwidth_lowest = 0,      /**< the source's low-bandwidth picture, where it offers one, without sound */
+    QIVOlib_recv_bandwidth_lowest = 0,      /**< the source's low-bandwidth picture, if it has one, without sound */
     QIVOlib_recv_bandwidth_audio_only = 10, /**< sound without picture */
     QIVOlib_recv_bandwidth_highest = 100    /**< the full picture, without sound: this runtime brings sound to a
                                                  receiver of its own, of bandwidth audio_only */

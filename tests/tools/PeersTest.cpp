@@ -1,3 +1,4 @@
+#include "tests/tools/MediaFile.h"
 #include "tests/tools/Publisher.h"
 
 #include <gmock/gmock.h>
@@ -63,14 +64,13 @@ TEST(Peers, ffplayAsksForARangeAndIsServed) {
 }
 
 TEST(Peers, mpvPlaysALoopedFileAsALiveStream) {
-    const auto made = play("ffmpeg -v error -y -f lavfi -i testsrc=duration=1:size=320x240:rate=25 -pix_fmt yuv420p "
-                           "/tmp/publish-peers-film.mp4");
-    ASSERT_EQ(made.code, 0) << made.output;
-    const PublishProcess publisher({"--input", "/tmp/publish-peers-film.mp4", "--size", "320x240", "--rate", "25"});
+    const MediaFile film("videotestsrc num-buffers=25 ! video/x-raw,format=I420,width=320,height=240,framerate=25/1 ! "
+                         "x264enc ! mp4mux",
+                         ".mp4");
+    const PublishProcess publisher({"--input", film.path(), "--size", "320x240", "--rate", "25"});
     const Outcome result =
         play("mpv --no-config --vo=null --ao=null --frames=60 --no-terminal " + publisher.address(0));
     EXPECT_EQ(result.code, 0) << result.output;
-    EXPECT_EQ(std::remove("/tmp/publish-peers-film.mp4"), 0);
 }
 
 } // namespace
