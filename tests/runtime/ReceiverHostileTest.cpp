@@ -5,6 +5,7 @@
 #include "tests/runtime/ReceiverFixture.h"
 #include "tests/runtime/RtpPackets.h"
 
+#include <atomic>
 #include <ostream>
 #include <string>
 #include <thread>
@@ -42,6 +43,7 @@ struct Behaviour {
     std::function<bool(Connection&, const std::string&)> described = {};
     std::function<bool(Connection&, const std::string&)> setUp = {};
     std::function<bool(Connection&, const std::string&)> play = {};
+    std::function<bool(Connection&, const std::string&)> tearDown = {};
     /// Called once playing.
     std::function<void(Connection&)> stream = {};
 };
@@ -74,10 +76,10 @@ void serve(Connection& connection, const Behaviour& behaviour) {
         const auto& special = is(request, "OPTIONS")    ? behaviour.options
                               : is(request, "DESCRIBE") ? behaviour.described
                               : is(request, "SETUP")    ? behaviour.setUp
+                              : is(request, "TEARDOWN") ? behaviour.tearDown
                                                         : behaviour.play;
         const bool isPlay = is(request, "PLAY");
-        const bool goesOn = special && (isPlay || !is(request, "TEARDOWN")) ? special(connection, request)
-                                                                            : conform(connection, request, behaviour);
+        const bool goesOn = special ? special(connection, request) : conform(connection, request, behaviour);
         if (!goesOn) {
             return;
         }
@@ -306,6 +308,10 @@ std::vector<Case> cases() {
         {"ClosesAtPlay", at({.play = closes()})},
         {"SaysNonsenseAtPlay", at({.play = says(noise(4000))})},
         {"RefusesToPlay", at({.play = refuses("454 Session Not Found")})},
+        {"HangsAtTeardown", at({.tearDown = hangs()})},
+        {"ClosesAtTeardown", at({.tearDown = closes()})},
+        {"SaysNonsenseAtTeardown", at({.tearDown = says(noise(4000))})},
+        {"RefusesTeardown", at({.tearDown = refuses("500 Internal Server Error")})},
         {"PlaysNothing", at({.stream = [](Connection& connection) { connection.untilClosed(); }})},
         {"ClosesWhilePlaying", at({.stream = [](Connection&) {}})},
         {"StreamsNoise", at({.stream = packets([](unsigned) { return noise(1400); })})},
@@ -395,6 +401,46 @@ TEST_P(Hostile, ServerDoesNotHoldUpTheEnd) {
 
 INSTANTIATE_TEST_SUITE_P(Receiver, Hostile, testing::ValuesIn(cases()),
                          [](const auto& test) { return std::string(test.param.name); });
+
+class HostileServer : public ReceiverFixture {};
+
+TEST_F(HostileServer, ThatDoesNotAnswerKeepAlivesIsReceivedAsLongAsItSends) {
+    const RtspServer good({.launch = h264("width=320,height=240,framerate=30/1"), .sessionTimeout = 2s});
+    RawServer deaf;
+    std::atomic<bool> playing = false;
+    std::atomic<int> unanswered = 0;
+    deaf.forwardTo(good.port(), [&](std::string bytes) {
+        playing = playing || is(bytes, "PLAY");
+        if (playing && (is(bytes, "GET_PARAMETER") || is(bytes, "OPTIONS"))) {
+            ++unanswered;
+            return std::string("\r\n"); // nothing, to an RTSP server
+        }
+        return bytes;
+    });
+    const auto receiver = receive(deaf.url());
+    ASSERT_TRUE(nextPicture(*receiver));
+    const auto deadline = Clock::now() + 4s;
+    while (Clock::now() < deadline) {
+        ASSERT_TRUE(nextPicture(*receiver, 1s));
+    }
+    EXPECT_GT(unanswered, 0);
+    EXPECT_EQ(deaf.connections(), 1);
+}
+
+TEST_F(HostileServer, ThatSendsVideoOfAnUnknownKindIsNamed) {
+    RawServer server;
+    server.setScript(
+        at({.sdp = "v=0\r\ns=-\r\nt=0 0\r\nm=video 0 RTP/AVP 96\r\na=rtpmap:96 VP8/90000\r\na=control:v\r\n"}));
+    testing::internal::CaptureStderr();
+    {
+        const auto receiver = receive(server.url());
+        EXPECT_EQ(receiver->capture(nullptr, nullptr, nullptr, 1s), QIVOlib_frame_type_none);
+    }
+    BackgroundThreads::waitForAll(2s);
+    const std::string text = testing::internal::GetCapturedStderr();
+    EXPECT_NE(text.find("libqivo: video in VP8 is not received, only H.264, H.265 and JPEG\n"), std::string::npos)
+        << text;
+}
 
 class HostileAddress : public ReceiverFixture {
   protected:

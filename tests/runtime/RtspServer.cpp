@@ -12,6 +12,11 @@ struct RtspServer::Callbacks {
     static void connected(GstRTSPServer*, GstRTSPClient* client, gpointer data) {
         ++self(data).m_connections;
         g_signal_connect(client, "setup-request", G_CALLBACK(setUp), data);
+        g_signal_connect(client, "new-session", G_CALLBACK(newSession), data);
+    }
+
+    static void newSession(GstRTSPClient*, GstRTSPSession* session, gpointer data) {
+        gst_rtsp_session_set_timeout(session, static_cast<guint>(self(data).m_options.sessionTimeout.count()));
     }
 
     static void setUp(GstRTSPClient*, GstRTSPContext* context, gpointer data) {
@@ -129,7 +134,12 @@ RtspServer::~RtspServer() {
 }
 
 std::string RtspServer::url(const std::string& path) const {
-    return "rtsp://" + m_options.address + ":" + std::to_string(m_port) + path;
+    const bool isIpv6 = m_options.address.find(':') != std::string::npos;
+    std::string host = m_options.address;
+    if (const std::size_t zone = host.find('%'); zone != std::string::npos) {
+        host.replace(zone, 1, "%25"); // as a URL has it
+    }
+    return "rtsp://" + (isIpv6 ? "[" + host + "]" : host) + ":" + std::to_string(m_port) + path;
 }
 
 void RtspServer::addFactory(const std::string& path, const std::string& launch) {

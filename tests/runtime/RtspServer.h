@@ -28,6 +28,7 @@ class RtspServer {
         std::string user = {}; ///< with a password: asks for a login
         std::string password = {};
         std::string address = "127.0.0.1";
+        std::chrono::seconds sessionTimeout{60};
         std::chrono::milliseconds reports{0}; ///< from one RTCP report to the next, about; 0: seconds
     };
 
