@@ -35,8 +35,8 @@ struct RtspServer::Callbacks {
             GstPad* pad = gst_element_get_static_pad(payloader, "src");
             gst_pad_add_probe(pad,
                               static_cast<GstPadProbeType>(GST_PAD_PROBE_TYPE_BUFFER | GST_PAD_PROBE_TYPE_BUFFER_LIST),
-                              send, new std::shared_ptr<std::atomic<bool>>(server.m_silent), // NOLINT
-                              [](gpointer silent) { delete static_cast<std::shared_ptr<std::atomic<bool>>*>(silent); });
+                              send, new Way{server.m_silent, server.m_lossy}, // NOLINT
+                              [](gpointer way) { std::default_delete<Way>()(static_cast<Way*>(way)); });
             gst_object_unref(pad);
             gst_object_unref(payloader);
         }
@@ -61,8 +61,18 @@ struct RtspServer::Callbacks {
         return gst_bin_get_by_name(GST_BIN(bin), ("pay" + std::to_string(number)).c_str());
     }
 
+    /// Where packets go, or do not.
+    struct Way {
+        std::shared_ptr<std::atomic<bool>> silent;
+        std::shared_ptr<std::atomic<unsigned>> lossy;
+        unsigned count = 0;
+    };
+
     static GstPadProbeReturn send(GstPad*, GstPadProbeInfo*, gpointer data) {
-        return **static_cast<std::shared_ptr<std::atomic<bool>>*>(data) ? GST_PAD_PROBE_DROP : GST_PAD_PROBE_OK;
+        auto& way = *static_cast<Way*>(data);
+        const unsigned lossy = *way.lossy;
+        const bool lost = lossy > 0 && ++way.count % lossy == 0;
+        return *way.silent || lost ? GST_PAD_PROBE_DROP : GST_PAD_PROBE_OK;
     }
 
     static GstRTSPFilterResult removeClient(GstRTSPServer*, GstRTSPClient*, gpointer) { return GST_RTSP_FILTER_REMOVE; }

@@ -44,6 +44,8 @@ class RtspServer {
 
     /// Whether anything is sent; connections stay open either way.
     void setSilent(bool silent) { *m_silent = silent; }
+    /// From now on every n-th buffer of packets is lost; 0 for none.
+    void setLossy(unsigned everyNth) { *m_lossy = everyNth; }
     /// Sets a property of an element of the pipeline that runs.
     void set(const std::string& element, const std::string& property, const std::string& value);
     /// Connections accepted so far.
@@ -66,6 +68,7 @@ class RtspServer {
     int m_port = 0;
     /// Shared with the pipelines, which may outlive the server.
     const std::shared_ptr<std::atomic<bool>> m_silent = std::make_shared<std::atomic<bool>>(false);
+    const std::shared_ptr<std::atomic<unsigned>> m_lossy = std::make_shared<std::atomic<unsigned>>(0);
     std::atomic<int> m_connections = 0;
     std::atomic<int> m_setups = 0;
     std::atomic<int> m_tcpSetups = 0;
