@@ -58,7 +58,8 @@ void AppDelegate::applicationDidFinishLaunching() {
     bindAudioPlayer();
 }
 
-/// The player's properties follow the model's: each is set after every change, and not before the first.
+/// The player's properties follow the model's: each is set now and after every change. A mute that the settings brought
+/// back must silence the player before a source is chosen.
 void AppDelegate::bindAudioPlayer() {
     connect(m_theModel, &AppData::muteChanged, this, [this] {
         if (m_audioPlayer) {
@@ -71,6 +72,8 @@ void AppDelegate::bindAudioPlayer() {
             m_audioPlayer->setSourceChangedCounter(m_theModel->selectedQIVOSourceChangedCount());
         }
     });
+    m_audioPlayer->setMute(m_theModel->mute());
+    m_audioPlayer->setSourceChangedCounter(m_theModel->selectedQIVOSourceChangedCount());
 }
 
 void AppDelegate::applicationWillTerminate() {

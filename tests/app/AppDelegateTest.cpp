@@ -32,6 +32,7 @@ class AppDelegateTest : public test::ShellFixture {
   protected:
     void SetUp() override {
         ShellFixture::SetUp();
+        model.setQIVOSourceInfoNamed("", ""); // another case may have chosen one
         queue.reset();
         setUrlOpener([this](const QUrl& url) {
             opened.push_back(url.toString().toStdString());
@@ -149,10 +150,11 @@ TEST_F(AppDelegateTest, TerminationWithoutLaunchAndWithoutMenuIsHarmless) {
 TEST_F(AppDelegateTest, PlayerExistsFromLaunchCompletionToTermination) {
     AppDelegate delegate;
     EXPECT_EQ(delegate.audioPlayer(), nullptr);
-    model.setMute(true); // reaches nobody yet
+    model.setMute(true);
     delegate.applicationDidFinishLaunching();
     ASSERT_NE(delegate.audioPlayer(), nullptr);
-    EXPECT_FALSE(delegate.audioPlayer()->mute()) << "a binding hands over changes, not the value that it finds";
+    EXPECT_TRUE(delegate.audioPlayer()->mute()) << "a binding hands over the value that it finds";
+    EXPECT_EQ(delegate.audioPlayer()->sourceChangedCounter(), model.selectedQIVOSourceChangedCount());
     delegate.applicationWillTerminate();
     EXPECT_EQ(delegate.audioPlayer(), nullptr);
     model.setMute(false); // reaches nobody any more
@@ -169,6 +171,25 @@ TEST_F(AppDelegateTest, PlayerFollowsTheModelsMuteAndSelectionCounter) {
     EXPECT_THAT(queue.calls, IsEmpty()) << "choosing a source while muted starts nothing";
     EXPECT_EQ(printed([&] { model.setMute(false); }), "Playing \n");
     EXPECT_FALSE(player.mute());
+    delegate.applicationWillTerminate();
+}
+
+TEST_F(AppDelegateTest, MuteThatWasRestoredIsSilenceUntilItIsTurnedOff) {
+    model.setMute(true); // as the settings did
+    AppDelegate delegate;
+    delegate.applicationDidFinishLaunching();
+    EXPECT_EQ(printed([&] { model.setQIVOSourceInfoNamed("STUDIO (Cam 1)", "fake://1"); }), "");
+    EXPECT_THAT(queue.calls, IsEmpty());
+    EXPECT_EQ(printed([&] { model.setMute(false); }), "Playing \n");
+    EXPECT_NE(queue.queue, nullptr);
+    delegate.applicationWillTerminate();
+}
+
+TEST_F(AppDelegateTest, SourceThatIsChosenBeforeLaunchCompletionIsPlayedFromThenOn) {
+    AppDelegate delegate;
+    model.setQIVOSourceInfoNamed("STUDIO (Cam 1)", "fake://1");
+    EXPECT_THAT(queue.calls, IsEmpty());
+    EXPECT_EQ(printed([&] { delegate.applicationDidFinishLaunching(); }), "Playing \n");
     delegate.applicationWillTerminate();
 }
 

@@ -5,6 +5,9 @@
 #include "tests/end-to-end/ViewerFixture.h"
 
 #include <cmath>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
 #include <gmock/gmock.h>
 
 namespace qivo::test {
@@ -27,6 +30,13 @@ class SoundTest : public ViewerTest {
     void SetUp() override {
         ViewerTest::SetUp();
         ASSERT_TRUE(m_server.start());
+    }
+
+    /// What the viewer finds as its user's settings. The sound server has given both of us a folder for them.
+    static void saveSettings(const std::string& text) {
+        const std::filesystem::path folder = std::string(std::getenv("XDG_CONFIG_HOME")) + "/Orvane";
+        std::filesystem::create_directories(folder);
+        std::ofstream(folder / "QIVO Viewer.conf") << text;
     }
 
     static testing::AssertionResult isTone(const std::vector<float>& samples, double tone) {
@@ -103,6 +113,19 @@ TEST_F(SoundTest, MuteIsSilenceAndSoundComesBack) {
     ASSERT_TRUE(hears(recording, kLeft[0], kRight[0]));
     pressSwitch("Control+m");
     EXPECT_TRUE(fallsSilent(recording));
+    pressSwitch("Control+m");
+    EXPECT_TRUE(hears(recording, kLeft[0], kRight[0]));
+}
+
+TEST_F(SoundTest, AMuteThatWasSavedIsSilenceUntilItIsTurnedOff) {
+    const auto publisher = publish("STUDIO", {"Cam 1"});
+    saveSettings("[General]\nORVQIVOViewer_mute=true\n");
+    startViewer();
+    const auto recording = m_server.record();
+    choose(0, 0, "STUDIO (Cam 1)");
+    ASSERT_TRUE(picturesArrive());
+    ASSERT_TRUE(fallsSilent(recording));
+    EXPECT_EQ(peak(recording.samples()), 0.0F) << "from the beginning on";
     pressSwitch("Control+m");
     EXPECT_TRUE(hears(recording, kLeft[0], kRight[0]));
 }
