@@ -10,6 +10,7 @@ namespace {
 
 constexpr std::int64_t kUnitsPerSecond = 10'000'000;
 constexpr std::int64_t kMillisecondsPerSecond = 1000;
+constexpr std::int64_t kMicrosecondsPerSecond = 1'000'000;
 
 float sane(float sample) {
     return std::isfinite(sample) ? std::clamp(sample, -SoundCutter::kLoudest, SoundCutter::kLoudest) : 0.0F;
@@ -18,9 +19,9 @@ float sane(float sample) {
 } // namespace
 
 /// The least number of samples that lasts so long.
-std::size_t SoundCutter::samplesIn(std::chrono::milliseconds time) const {
+std::size_t SoundCutter::samplesIn(std::chrono::microseconds time) const {
     const std::int64_t product = time.count() * m_format.rate;
-    return static_cast<std::size_t>((product + kMillisecondsPerSecond - 1) / kMillisecondsPerSecond);
+    return static_cast<std::size_t>((product + kMicrosecondsPerSecond - 1) / kMicrosecondsPerSecond);
 }
 
 std::size_t SoundCutter::pending() const {
@@ -44,7 +45,8 @@ void SoundCutter::add(const Piece& piece) {
     if (!m_pending.empty() && !continues(piece)) {
         flush();
     }
-    if (m_pending.empty()) {
+    const bool alone = m_pending.empty();
+    if (alone) {
         m_format = piece.format;
         m_timecode = piece.timecode;
         m_taken = piece.taken;
@@ -52,26 +54,34 @@ void SoundCutter::add(const Piece& piece) {
     }
     m_pending.insert(m_pending.end(), piece.samples,
                      piece.samples + piece.count * static_cast<std::size_t>(m_format.channels));
-    if (pending() >= samplesIn(kJoined)) {
-        emitAll();
+    const std::size_t longest = static_cast<std::size_t>(m_format.rate) * kLongest.count() / kMillisecondsPerSecond;
+    const bool good = alone && pending() >= samplesIn(kJoined) && pending() <= longest;
+    const std::size_t length = good ? pending() : samplesIn(kJoined);
+    std::size_t first = 0;
+    for (; pending() - first >= length; first += length) {
+        emit(first, length);
     }
+    if (first > 0) {
+        drop(first, piece);
+    }
+}
+
+/// Forgets what has become frames. What is left is the end of the piece, from which it gets its times.
+void SoundCutter::drop(std::size_t count, const Piece& piece) {
+    const auto channels = static_cast<std::ptrdiff_t>(m_format.channels);
+    m_pending.erase(m_pending.begin(), m_pending.begin() + static_cast<std::ptrdiff_t>(count) * channels);
+    const std::int64_t into = unitsOf(piece.count - pending());
+    m_timecode = piece.timecode + into;
+    m_taken = piece.taken;
+    if (m_taken) {
+        *m_taken += into;
+    }
+    m_arrived = piece.arrived;
 }
 
 void SoundCutter::flush() {
     if (!m_pending.empty() && pending() >= samplesIn(kShortest)) {
-        emitAll();
-    }
-    m_pending.clear();
-}
-
-/// As few frames as the longest one allows, of the same length but for a sample.
-void SoundCutter::emitAll() {
-    const std::size_t total = pending();
-    const std::size_t longest = static_cast<std::size_t>(m_format.rate) * kLongest.count() / kMillisecondsPerSecond;
-    const std::size_t frames = (total + longest - 1) / longest;
-    for (std::size_t i = 0; i < frames; ++i) {
-        const std::size_t first = total * i / frames;
-        emit(first, total * (i + 1) / frames - first);
+        emit(0, pending());
     }
     m_pending.clear();
 }

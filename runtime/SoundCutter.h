@@ -12,8 +12,9 @@
 
 namespace qivo::runtime {
 
-/// Makes frames of kShortest to kLongest out of sound that comes in pieces of any length: short pieces are joined, long
-/// ones are divided. A frame never spans a gap or a change of format.
+/// Makes frames of kJoined to kLongest out of sound that comes in pieces of any length: short pieces are joined, long
+/// ones are divided. A frame never spans a gap or a change of format; what is left before one may be as short as
+/// kShortest.
 ///
 /// Samples that are no numbers become silence, and others are held within plus and minus kLoudest.
 ///
@@ -21,9 +22,11 @@ namespace qivo::runtime {
 class SoundCutter {
   public:
     static constexpr std::chrono::milliseconds kShortest{5};
-    static constexpr std::chrono::milliseconds kLongest{40};
-    /// Short pieces are joined until they last this long: less would wake up the listener for nothing.
-    static constexpr std::chrono::milliseconds kJoined{10};
+    static constexpr std::chrono::milliseconds kLongest{33};
+    /// What pieces are joined to and divided into: 1024 samples at 48000 Hz. A listener keeps three frames on their way
+    /// to the device, the first of them all but played, and a device may take 2048 at a time. Longer ones would be
+    /// latency without a use.
+    static constexpr std::chrono::microseconds kJoined{21333};
     /// A piece that begins this much off the end of the last one comes after a gap.
     static constexpr std::chrono::milliseconds kGap{20};
     static constexpr float kLoudest = 16.0F;
@@ -48,10 +51,10 @@ class SoundCutter {
 
   private:
     bool continues(const Piece& piece) const;
-    std::size_t samplesIn(std::chrono::milliseconds time) const;
+    std::size_t samplesIn(std::chrono::microseconds time) const;
     std::size_t pending() const;
     std::int64_t unitsOf(std::size_t samples) const;
-    void emitAll();
+    void drop(std::size_t count, const Piece& piece);
     void emit(std::size_t first, std::size_t count);
 
     const Emit m_emit;
