@@ -25,3 +25,10 @@ target_link_libraries(qivo_allocation_count PUBLIC qivo_options)
 qivo_test(test-audio-allocations SOURCES AllocationTest.cpp
           LIBRARIES qivo_audio_player qivo_null_audio qivo_steady_source qivo_allocation_count qivo_sound_server
           ENVIRONMENT ${playback_environment})
+
+# The whole way of the sound in simulated time.
+add_library(qivo_live_source STATIC LiveSource.cpp LiveSource.h)
+target_link_libraries(qivo_live_source PUBLIC qivo_interface PRIVATE qivo_runtime_sound)
+qivo_test(test-playback-queue SOURCES PlaybackQueueTest.cpp
+          LIBRARIES qivo_audio_player qivo_null_audio qivo_live_source TSAN BUSY
+          ENVIRONMENT ${playback_environment})
