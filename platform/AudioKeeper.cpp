@@ -62,11 +62,14 @@ void AudioKeeper::service() {
     }
     const auto state = m_output ? m_output->state() : AudioOutput::State::Failed;
     if (m_phase == Phase::Waiting) {
-        if (now >= m_retryAt && open() != 0) {
-            lose(now);
+        if (now < m_retryAt) {
+            return;
+        }
+        if (const int status = open(); status != 0) {
+            lose(now, "status " + std::to_string(status));
         }
     } else if (state == AudioOutput::State::Failed || state == AudioOutput::State::Absent) {
-        lose(now);
+        lose(now, m_output->description());
     } else if (m_phase == Phase::Playing) {
         watch(now);
     } else if (state == AudioOutput::State::Running) {
@@ -81,6 +84,7 @@ void AudioKeeper::play(nanoseconds now) {
     m_stalledFor = {};
     m_pulls = m_tap->pulls();
     m_tap->attach();
+    m_driver->tell("Sound plays through " + m_output->description());
 }
 
 void AudioKeeper::watch(nanoseconds now) {
@@ -90,13 +94,14 @@ void AudioKeeper::watch(nanoseconds now) {
     m_stalledFor = pulls == m_pulls ? m_stalledFor + watched : nanoseconds::zero();
     m_pulls = pulls;
     if (m_stalledFor >= kStall) {
-        lose(now);
+        lose(now, "the device takes nothing any more");
     } else if (now - m_playingFrom >= kStable) {
         m_retryPause = kFirstRetry;
     }
 }
 
-void AudioKeeper::lose(nanoseconds now) {
+void AudioKeeper::lose(nanoseconds now, const std::string& reason) {
+    m_driver->tell((m_phase == Phase::Playing ? "Sound has stopped: " : "No sound: ") + reason);
     if (m_phase == Phase::Playing) {
         m_drainedTo = now;
     }

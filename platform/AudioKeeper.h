@@ -6,11 +6,13 @@
 #include <chrono>
 #include <cstdint>
 #include <memory>
+#include <string>
 
 namespace qivo {
 
 /// Keeps a drain flowing: into a device where there is one, by the clock where there is none, and looks for a device
-/// again whenever it has lost it. Never waits; the owner calls `service` now and then.
+/// again whenever it has lost it. Never waits; the owner calls `service` now and then. The system log gets a line
+/// whenever it changes whether and where sound is heard.
 ///
 /// Thread: the owner's.
 class AudioKeeper {
@@ -50,7 +52,7 @@ class AudioKeeper {
     void close();
     void play(std::chrono::nanoseconds now);
     void watch(std::chrono::nanoseconds now);
-    void lose(std::chrono::nanoseconds now);
+    void lose(std::chrono::nanoseconds now, const std::string& reason);
     void drainByClock(std::chrono::nanoseconds now);
 
     const AudioStreamBasicDescription m_format;

@@ -1,6 +1,7 @@
 #include "platform/AudioOutput.h"
 
 #include "platform/FallbackAudioOutput.h"
+#include "platform/Log.h"
 #include "platform/PulseAudioOutput.h"
 #include "platform/SdlAudioOutput.h"
 
@@ -21,6 +22,17 @@ Chosen& chosen() {
 }
 
 } // namespace
+
+void AudioOutputDriver::tell(const std::string& line) {
+    {
+        const std::lock_guard guard(m_mutex);
+        if (line == m_told) {
+            return;
+        }
+        m_told = line;
+    }
+    logLine("%s", line.c_str());
+}
 
 void setAudioOutputDriver(std::shared_ptr<AudioOutputDriver> driver) {
     const std::lock_guard guard(chosen().mutex);

@@ -5,6 +5,8 @@
 #include <chrono>
 #include <cstddef>
 #include <memory>
+#include <mutex>
+#include <string>
 
 namespace qivo {
 
@@ -32,11 +34,14 @@ class AudioOutput {
         Opening,
         Running,
         Failed, ///< it could not be opened, or is gone; it does not come back
-        Absent  ///< failed, since nothing at all is there that the driver could have asked
+        Absent  ///< failed, since nothing is there that the driver could have asked, or that lets itself be asked
     };
     virtual ~AudioOutput() = default;
     /// Thread: the owner's.
     virtual State state() = 0;
+    /// For the log: what it plays to while `state` is Running, and why it does not once that has told a failure.
+    /// Thread: the owner's.
+    virtual std::string description() = 0;
 };
 
 /// A way to reach devices, with the clock that goes with it.
@@ -51,6 +56,14 @@ class AudioOutputDriver {
                      std::unique_ptr<AudioOutput>& output) = 0;
     /// Time that never goes back, from any origin.
     virtual std::chrono::nanoseconds now() const = 0;
+
+    /// Writes a line to the system log, unless it is the same as the last one: attempts are made again and again, and a
+    /// queue follows another.
+    void tell(const std::string& line);
+
+  private:
+    std::mutex m_mutex; // protects m_told
+    std::string m_told;
 };
 
 /// The driver that queues use from now on; null is the default, this machine's devices. Queues that exist keep theirs.

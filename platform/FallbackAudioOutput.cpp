@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <atomic>
+#include <string>
 #include <utility>
 
 namespace qivo {
@@ -41,12 +42,23 @@ class FallbackAudioOutput : public AudioOutput {
         return m_failed ? State::Failed : m_output->state();
     }
 
+    std::string description() override {
+        if (m_found) {
+            return m_looking->description() + " is there now";
+        }
+        if (!m_onFallback) {
+            return m_output->description();
+        }
+        return m_failed ? m_why : m_output->description() + "; " + m_why;
+    }
+
   private:
     void judge(State preferred) {
         if (preferred == State::Running || preferred == State::Failed) {
             m_drivers->preferredIsThere = true;
         } else if (preferred == State::Absent && !m_drivers->preferredIsThere) {
             m_onFallback = true;
+            m_why = m_output->description();
             m_lookAt = m_drivers->preferred->now() + FallbackAudioDriver::kLookInterval;
             m_failed = m_drivers->fallback->open(m_format, m_source, m_output) != 0;
         }
@@ -61,11 +73,12 @@ class FallbackAudioOutput : public AudioOutput {
             return;
         }
         const State found = m_looking->state();
-        if (found == State::Absent) {
-            lookLater();
-        } else if (found != State::Opening) {
+        if (found == State::Running) {
             m_drivers->preferredIsThere = true;
+            m_found = true;
             m_failed = true;
+        } else if (found != State::Opening) {
+            lookLater(); // without a device the preferred driver would take away sound that is heard
         }
     }
 
@@ -80,6 +93,8 @@ class FallbackAudioOutput : public AudioOutput {
     std::unique_ptr<AudioOutput> m_output; // the preferred driver's until m_onFallback
     bool m_onFallback = false;
     bool m_failed = false;
+    bool m_found = false;                   // by m_looking, which plays
+    std::string m_why;                      // m_onFallback: what the preferred driver said
     std::unique_ptr<AudioOutput> m_looking; // while the preferred driver is looked for
     std::chrono::nanoseconds m_lookAt{};    // m_onFallback
 };

@@ -9,8 +9,8 @@ namespace qivo {
 /// One driver where it finds something to play to, another one only where the first finds nothing at all.
 ///
 /// Once the first has found something in this process, the second is never tried again: a sound server that restarts
-/// must not find its hardware taken. While the second plays, the first is looked for now and then; when it is there the
-/// output fails, and the next one is the first's.
+/// must not find its hardware taken. While the second plays, the first is looked for now and then; when it has a device
+/// to play to the output fails, and the next one is the first's.
 class FallbackAudioDriver : public AudioOutputDriver {
   public:
     static constexpr std::chrono::seconds kLookInterval{10};

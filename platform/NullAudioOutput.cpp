@@ -129,6 +129,7 @@ class NullAudioOutput : public AudioOutput {
     NullAudioOutput& operator=(const NullAudioOutput&) = delete;
 
     State state() override { return m_device->state; }
+    std::string description() override { return "a stand-in for a device"; }
 
   private:
     const std::shared_ptr<NullAudioDriver::State> m_driver;

@@ -84,6 +84,17 @@ class Device {
     // --- Owner.
     bool usable() const { return m_loop != nullptr; }
     AudioOutput::State state() const { return m_state; }
+    std::string description() const {
+        const std::string reason = std::string(" (") + pa_strerror(m_error) + ")";
+        switch (m_state) {
+        case AudioOutput::State::Absent:
+            return "no sound server" + reason;
+        case AudioOutput::State::Failed:
+            return "no stream of the sound server" + reason;
+        default:
+            return "the sound server";
+        }
+    }
     void close() {
         m_unwanted = true;
         pa_mainloop_wakeup(m_loop.get());
@@ -96,7 +107,7 @@ class Device {
             }
         }
         if (isOpen()) {
-            become(AudioOutput::State::Failed);
+            fail(PA_ERR_INTERNAL);
         }
         disconnect();
     }
@@ -107,6 +118,12 @@ class Device {
     void become(AudioOutput::State state) {
         m_state = state;
         m_source->stateChanged();
+    }
+
+    /// A server that was never ready might as well not be there: none, or one that denies access or does not answer.
+    void fail(int error) {
+        m_error = error;
+        become(m_stream ? AudioOutput::State::Failed : AudioOutput::State::Absent);
     }
 
     bool turn() {
@@ -134,14 +151,14 @@ class Device {
         switch (pa_context_get_state(m_context.get())) {
         case PA_CONTEXT_READY:
             if (!play()) {
+                m_error = pa_context_errno(m_context.get());
                 become(AudioOutput::State::Failed);
             }
             break;
         case PA_CONTEXT_FAILED:
         case PA_CONTEXT_TERMINATED:
             if (isOpen()) {
-                const bool refused = !m_stream && pa_context_errno(m_context.get()) == PA_ERR_CONNECTIONREFUSED;
-                become(refused ? AudioOutput::State::Absent : AudioOutput::State::Failed);
+                fail(pa_context_errno(m_context.get()));
             }
             break;
         default:
@@ -178,7 +195,7 @@ class Device {
         if (state == PA_STREAM_READY) {
             become(AudioOutput::State::Running);
         } else if (!PA_STREAM_IS_GOOD(state) && isOpen()) {
-            become(AudioOutput::State::Failed);
+            fail(pa_context_errno(m_context.get()));
         }
     }
 
@@ -217,6 +234,7 @@ class Device {
     const std::shared_ptr<AudioSource> m_source;
     const Loop m_loop; // its thread's, save for waking it up
     std::atomic<AudioOutput::State> m_state = AudioOutput::State::Opening;
+    std::atomic<int> m_error = PA_OK; // set before the state
     std::atomic<bool> m_unwanted = false;
     // Its thread only.
     Context m_context;
@@ -231,6 +249,7 @@ class PulseAudioOutput : public AudioOutput {
     PulseAudioOutput& operator=(const PulseAudioOutput&) = delete;
 
     State state() override { return m_device->state(); }
+    std::string description() override { return m_device->description(); }
 
   private:
     const std::shared_ptr<Device> m_device;

@@ -22,6 +22,7 @@ struct Device {
     std::string systems;
     std::atomic<AudioOutput::State> state = AudioOutput::State::Opening;
     std::atomic<bool> unwanted = false;
+    std::string trouble; // written before the state becomes Failed, and read after that
     // Worker only.
     SDL_AudioDeviceID id = 0;
     bool tried = false;
@@ -93,6 +94,11 @@ class Worker {
         });
     }
 
+    static void fail(Device& device, const char* reason) {
+        device.trouble = reason;
+        become(device, AudioOutput::State::Failed);
+    }
+
     static void become(Device& device, AudioOutput::State state) {
         device.state = state;
         device.source->stateChanged();
@@ -101,8 +107,12 @@ class Worker {
     void open(Device& device) {
         device.tried = true;
         // A machine that lists no device is not asked to open one: its libraries would complain at every attempt.
-        if (device.unwanted || !startUp(device.systems) || SDL_GetNumAudioDevices(0) == 0) {
-            become(device, AudioOutput::State::Failed);
+        if (device.unwanted || !startUp(device.systems)) {
+            fail(device, SDL_GetError());
+            return;
+        }
+        if (SDL_GetNumAudioDevices(0) == 0) {
+            fail(device, "none is there");
             return;
         }
         SDL_AudioSpec wanted{};
@@ -114,7 +124,7 @@ class Worker {
         wanted.userdata = device.source.get();
         device.id = SDL_OpenAudioDevice(nullptr, 0, &wanted, nullptr, 0);
         if (device.id == 0) {
-            become(device, AudioOutput::State::Failed);
+            fail(device, SDL_GetError());
             return;
         }
         SDL_PauseAudioDevice(device.id, 0);
@@ -123,7 +133,7 @@ class Worker {
 
     static void poll(Device& device) {
         if (device.state == AudioOutput::State::Running && SDL_GetAudioDeviceStatus(device.id) == SDL_AUDIO_STOPPED) {
-            become(device, AudioOutput::State::Failed);
+            fail(device, "it is gone");
         }
     }
 
@@ -221,6 +231,12 @@ class SdlAudioOutput : public AudioOutput {
     SdlAudioOutput& operator=(const SdlAudioOutput&) = delete;
 
     State state() override { return m_device->state; }
+    std::string description() override {
+        if (m_device->state == State::Failed) {
+            return "no device through SDL (" + m_device->systems + ": " + m_device->trouble + ")";
+        }
+        return "a device through SDL (" + m_device->systems + ")";
+    }
 
   private:
     const std::shared_ptr<Device> m_device;

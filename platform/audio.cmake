@@ -6,8 +6,8 @@ add_library(qivo_audio_queue STATIC
             AudioDrain.cpp AudioDrain.h AudioKeeper.cpp AudioKeeper.h AudioOutput.cpp AudioOutput.h
             AudioQueue.cpp AudioQueue.h FallbackAudioOutput.cpp FallbackAudioOutput.h
             PulseAudioOutput.cpp PulseAudioOutput.h SdlAudioOutput.cpp SdlAudioOutput.h SpscQueue.h)
-target_link_libraries(qivo_audio_queue PUBLIC qivo_options Qt6::Core Threads::Threads 
-                      PRIVATE PkgConfig::PULSE PkgConfig::SDL2)
+target_link_libraries(qivo_audio_queue PUBLIC qivo_options Qt6::Core Threads::Threads
+                      PRIVATE qivo_platform_base PkgConfig::PULSE PkgConfig::SDL2)
 
 add_library(qivo_null_audio STATIC NullAudioOutput.cpp NullAudioOutput.h)
 target_link_libraries(qivo_null_audio PUBLIC qivo_audio_queue)

@@ -9,19 +9,27 @@
 #include "tests/audio/SoundServer.h"
 #include "tests/fake/FakeQivo.h"
 #include "tests/platform/EventLoop.h"
+#include "tests/platform/LogCapture.h"
 
+#include <QSocketNotifier>
 #include <SDL.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <csignal>
+#include <cstdlib>
 #include <ctime>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <unistd.h>
 
 using namespace qivo;
 using namespace qivo::test;
 using namespace std::chrono_literals;
+using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::Not;
+using testing::StartsWith;
 
 namespace {
 
@@ -376,6 +384,41 @@ TEST_F(RealSoundTest, SdlPlaysOnlyUntilThereIsASoundServer) {
     EXPECT_TRUE(EventLoop::until([] { return SDL_WasInit(0) == 0; }));
 }
 
+/// The same where a server is there that turns everybody away before it is asked for anything.
+TEST_F(RealSoundTest, SdlPlaysWhereASoundServerLetsNobodyIn) {
+    LogCapture log;
+    const std::string path = std::string(std::getenv("PULSE_RUNTIME_PATH")) + "/socket";
+    sockaddr_un address{AF_UNIX, {}};
+    path.copy(address.sun_path, sizeof(address.sun_path) - 1);
+    const int listener = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    ASSERT_EQ(bind(listener, reinterpret_cast<const sockaddr*>(&address), sizeof(address)), 0);
+    ASSERT_EQ(listen(listener, 1), 0);
+    int turnedAway = 0;
+    QSocketNotifier knock(listener, QSocketNotifier::Read);
+    QObject::connect(&knock, &QSocketNotifier::activated, &context, [&] {
+        close(accept(listener, nullptr, nullptr));
+        ++turnedAway;
+    });
+    setAudioOutputDriver(std::make_shared<FallbackAudioDriver>(std::make_shared<PulseAudioDriver>(),
+                                                               std::make_shared<SdlAudioDriver>("dummy")));
+    player.reset();
+    player = std::make_unique<AudioPlayback>();
+    observed = player.get();
+    listenTo({48000, {440, 1000}});
+    std::vector<std::string> told;
+    EXPECT_TRUE(EventLoop::until([&] {
+        for (const std::string& line : log.take()) {
+            told.push_back(line);
+        }
+        return !told.empty();
+    }));
+    EXPECT_THAT(told, ElementsAre(StartsWith("Sound plays through a device through SDL (dummy); no sound server (")));
+    EXPECT_GT(turnedAway, 0);
+    player->stopPlayback();
+    close(listener);
+    EXPECT_TRUE(EventLoop::until([] { return SDL_WasInit(0) == 0; }));
+}
+
 TEST_F(RealSoundTest, AHungServerHaltsNeitherTheLoopNorThePlayer) {
     startServer();
     const auto recording = server.record();
@@ -414,4 +457,27 @@ TEST_F(RealSoundTest, WithoutADeviceThePlayerRunsAndDoesNotSpin) {
     EXPECT_LT(busy, 0.25);
     const double seconds = static_cast<double>(fake.callsOf("recv_capture").size() - taken) * 1024 / 48000;
     EXPECT_NEAR(seconds, 2.0, 0.3) << "at the pace of the clock";
+}
+
+/// What the application ships with, where there is neither a sound server nor a device of the kernel's.
+TEST_F(RealSoundTest, WithoutAnyDeviceTheDefaultSaysSoAndDoesNotSpin) {
+    LogCapture log;
+    setenv("ALSA_CONFIG_PATH", "/dev/null", 1);
+    setAudioOutputDriver(nullptr);
+    player.reset();
+    player = std::make_unique<AudioPlayback>();
+    observed = player.get();
+    listenTo({48000, {440, 1000}});
+    EventLoop::run(1s); // two attempts or three
+    const std::size_t taken = fake.callsOf("recv_capture").size();
+    const std::clock_t before = std::clock();
+    EventLoop::run(2s);
+    const double busy = static_cast<double>(std::clock() - before) / CLOCKS_PER_SEC / 2;
+    EXPECT_LT(busy, 0.25);
+    const double seconds = static_cast<double>(fake.callsOf("recv_capture").size() - taken) * 1024 / 48000;
+    EXPECT_NEAR(seconds, 2.0, 0.3) << "at the pace of the clock";
+    EXPECT_THAT(log.take(), ElementsAre("No sound: no device through SDL (alsa: none is there); no sound server "
+                                        "(Connection refused)"))
+        << "once";
+    unsetenv("ALSA_CONFIG_PATH");
 }

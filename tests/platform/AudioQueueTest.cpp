@@ -4,6 +4,7 @@
 #include "platform/NullAudioOutput.h"
 
 #include "tests/platform/EventLoop.h"
+#include "tests/platform/LogCapture.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -21,6 +22,8 @@ using namespace qivo::test;
 using namespace std::chrono_literals;
 using std::chrono::nanoseconds;
 using testing::Each;
+using testing::ElementsAre;
+using testing::IsEmpty;
 
 namespace {
 
@@ -618,6 +621,41 @@ TEST_F(AudioQueueTest, AfterASoundDeviceTheFirstPauseIsShortAgain) {
     driver->unplug();
     advance(300ms);
     EXPECT_EQ(driver->attempts(), 7);
+}
+
+// --- What the system log tells.
+
+TEST_F(AudioQueueTest, EachChangeOfWhatIsHeardIsToldOnce) {
+    LogCapture log;
+    NullAudioDriver::Options options;
+    options.failingOpens = 5;
+    use(options);
+    makeAndStart();
+    advance(20s);
+    ASSERT_EQ(driver->attempts(), 6);
+    EXPECT_THAT(log.take(),
+                ElementsAre("No sound: a stand-in for a device", "Sound plays through a stand-in for a device"));
+    AudioQueueStop(queue);
+    for (AudioQueueBufferRef buffer : allocated) {
+        refill(buffer);
+    }
+    AudioQueueStart(queue);
+    advance(1s);
+    EXPECT_THAT(log.take(), IsEmpty()) << "as before";
+    driver->unplug();
+    EventLoop::settle();
+    EXPECT_THAT(log.take(), ElementsAre("Sound has stopped: a stand-in for a device"));
+    advance(1s);
+    EXPECT_THAT(log.take(), ElementsAre("Sound plays through a stand-in for a device"));
+    driver->setHung(true);
+    advance(1500ms);
+    EXPECT_THAT(log.take(), ElementsAre("Sound has stopped: the device takes nothing any more",
+                                        "Sound plays through a stand-in for a device"));
+    options.status = 4711;
+    driver->setOptions(options);
+    driver->unplug();
+    advance(3s);
+    EXPECT_THAT(log.take(), ElementsAre("Sound has stopped: a stand-in for a device", "No sound: status 4711"));
 }
 
 TEST_F(AudioQueueTest, StoppingWhileTheDeviceOpensIsClean) {

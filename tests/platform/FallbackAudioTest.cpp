@@ -8,6 +8,7 @@
 #include <atomic>
 #include <chrono>
 #include <memory>
+#include <string>
 
 using namespace qivo;
 using namespace std::chrono_literals;
@@ -145,6 +146,36 @@ TEST_F(FallbackAudioTest, ThePreferredDriverIsLookedForNowAndThenAndSilently) {
     EXPECT_EQ(fallback->attempts(), attempts);
     EXPECT_EQ(fallback->outputs(), 0);
     EXPECT_EQ(preferred->heard().back(), 1.0F);
+}
+
+TEST_F(FallbackAudioTest, APreferredDriverWithoutADeviceLeavesTheOtherItsSound) {
+    preferred->setOptions(absent());
+    open();
+    ASSERT_EQ(advance(50ms), State::Running);
+    preferred->setOptions(failing());
+    ASSERT_EQ(advance(3 * FallbackAudioDriver::kLookInterval - 1s), State::Running);
+    EXPECT_EQ(preferred->attempts(), 3) << "and is looked for as before";
+    EXPECT_EQ(fallback->attempts(), 1);
+    preferred->setOptions(absent());
+    open();
+    EXPECT_EQ(advance(100ms), State::Running) << "what never played is not waited for";
+    EXPECT_EQ(fallback->attempts(), 2);
+}
+
+TEST_F(FallbackAudioTest, ItSaysWhatItPlaysToAndWhy) {
+    preferred->setOptions(absent());
+    fallback->setOptions(failing());
+    const std::string one = "a stand-in for a device";
+    open();
+    EXPECT_EQ(output->description(), one);
+    ASSERT_EQ(advance(50ms), State::Failed);
+    EXPECT_EQ(output->description(), one + "; " + one);
+    fallback->setOptions(NullAudioDriver::Options());
+    open();
+    ASSERT_EQ(advance(50ms), State::Running);
+    preferred->setOptions(NullAudioDriver::Options());
+    ASSERT_EQ(advance(FallbackAudioDriver::kLookInterval), State::Failed);
+    EXPECT_EQ(output->description(), one + " is there now");
 }
 
 TEST_F(FallbackAudioTest, TheOthersEndIsTold) {
