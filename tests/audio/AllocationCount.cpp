@@ -39,6 +39,8 @@ void* __libc_malloc(std::size_t size);
 void* __libc_calloc(std::size_t count, std::size_t size);
 void* __libc_realloc(void* memory, std::size_t size);
 void* __libc_memalign(std::size_t alignment, std::size_t size);
+void* __libc_valloc(std::size_t size);
+void* __libc_pvalloc(std::size_t size);
 
 __attribute__((visibility("default"))) void* malloc(std::size_t size) {
     ++allocations;
@@ -58,6 +60,31 @@ __attribute__((visibility("default"))) void* realloc(void* memory, std::size_t s
 __attribute__((visibility("default"))) void* aligned_alloc(std::size_t alignment, std::size_t size) {
     ++allocations;
     return __libc_memalign(alignment, size);
+}
+
+__attribute__((visibility("default"))) void* memalign(std::size_t alignment, std::size_t size) {
+    ++allocations;
+    return __libc_memalign(alignment, size);
+}
+
+__attribute__((visibility("default"))) void* valloc(std::size_t size) {
+    ++allocations;
+    return __libc_valloc(size);
+}
+
+__attribute__((visibility("default"))) void* pvalloc(std::size_t size) {
+    ++allocations;
+    return __libc_pvalloc(size);
+}
+
+__attribute__((visibility("default"))) void* reallocarray(void* memory, std::size_t count, std::size_t size) {
+    ++allocations;
+    std::size_t all = 0;
+    if (__builtin_mul_overflow(count, size, &all)) {
+        errno = ENOMEM;
+        return nullptr;
+    }
+    return __libc_realloc(memory, all);
 }
 
 __attribute__((visibility("default"))) int posix_memalign(void** memory, std::size_t alignment, std::size_t size) {

@@ -6,15 +6,25 @@
 #include "tests/audio/AllocationCount.h"
 #include "tests/audio/SoundServer.h"
 #include "tests/audio/SteadySource.h"
+#include "tests/audio/WaitCount.h"
 #include "tests/platform/EventLoop.h"
 
 #include <gtest/gtest.h>
 
 #include <atomic>
+#include <condition_variable>
 #include <cstdlib>
+#include <linux/futex.h>
+#include <malloc.h>
 #include <memory>
+#include <mutex>
 #include <new>
+#include <semaphore.h>
+#include <shared_mutex>
+#include <sys/syscall.h>
 #include <thread>
+#include <unistd.h>
+#include <utility>
 #include <vector>
 
 using namespace qivo;
@@ -25,14 +35,18 @@ namespace {
 
 std::atomic<std::uint64_t> deviceAllocations = 0;
 std::atomic<std::uint64_t> devicePulls = 0;
+std::atomic<std::uint64_t> deviceWaits = 0;
 
-/// On the device's thread: everything between the end of the first pull and that of the last is counted, the waiting
-/// in between too.
+/// On the device's thread: of allocations everything between the end of the first pull and that of the last is counted,
+/// the waiting in between too; of waits those of the pulls.
 void countOnDevice(bool after) {
     thread_local std::uint64_t before = 0;
+    thread_local std::uint64_t waits = 0;
     if (!after) {
+        waits = waitsOfThisThread();
         return;
     }
+    deviceWaits += waitsOfThisThread() - waits;
     const std::uint64_t now = allocationsOfThisThread();
     if (++devicePulls > 1) {
         deviceAllocations += now - before;
@@ -40,14 +54,16 @@ void countOnDevice(bool after) {
     before = now;
 }
 
-/// Stands between a device and its source and counts what a pull allocates.
+/// Stands between a device and its source and counts what a pull allocates, and how often it may have waited.
 class CountingSource : public AudioSource {
   public:
     explicit CountingSource(std::shared_ptr<AudioSource> source) : m_source(std::move(source)) {}
     void pull(float* out, std::size_t floats) noexcept override {
         const AllocationCount count;
+        const std::uint64_t waits = waitsOfThisThread();
         m_source->pull(out, floats);
         deviceAllocations += count.soFar();
+        deviceWaits += waitsOfThisThread() - waits;
         ++devicePulls;
     }
     void stateChanged() noexcept override { m_source->stateChanged(); }
@@ -72,6 +88,7 @@ class AllocationTest : public testing::Test {
     void SetUp() override {
         deviceAllocations = 0;
         devicePulls = 0;
+        deviceWaits = 0;
         AppData::inst()->setMute(false);
         AppData::inst()->setQIVOSourceInfoNamed("A (1)", "u1");
     }
@@ -110,6 +127,57 @@ TEST_F(AllocationTest, TheCounterCountsEveryWayToAllocate) {
     use(memory);
     ::operator delete(memory, std::align_val_t(64));
     EXPECT_EQ(count.soFar(), 5U);
+    // NOLINTBEGIN(cppcoreguidelines-no-malloc)
+    for (void* aligned :
+         {memalign(64, 64), valloc(64), pvalloc(64), reallocarray(nullptr, 8, 8), aligned_alloc(64, 64)}) {
+        use(aligned);
+        std::free(aligned);
+    }
+    EXPECT_EQ(count.soFar(), 10U);
+    ASSERT_EQ(posix_memalign(&memory, 64, 64), 0);
+    use(memory);
+    std::free(memory);
+    EXPECT_EQ(count.soFar(), 11U);
+    // NOLINTEND(cppcoreguidelines-no-malloc)
+}
+
+TEST_F(AllocationTest, TheCounterCountsEveryWayToWait) {
+    std::uint64_t before = waitsOfThisThread();
+    const auto counted = [&before] {
+        const std::uint64_t now = waitsOfThisThread();
+        return now - std::exchange(before, now);
+    };
+    std::mutex mutex;
+    std::unique_lock lock(mutex);
+    EXPECT_EQ(counted(), 1U);
+    std::condition_variable condition;
+    condition.wait_for(lock, 1ms);
+    EXPECT_EQ(counted(), 1U);
+    std::thread waker([&] {
+        const std::lock_guard guard(mutex); // free from the wait on
+        condition.notify_all();
+    });
+    condition.wait(lock);
+    EXPECT_EQ(counted(), 1U);
+    waker.join();
+    lock.unlock();
+    counted();
+    std::shared_mutex shared;
+    shared.lock();
+    shared.unlock();
+    shared.lock_shared();
+    shared.unlock_shared();
+    EXPECT_EQ(counted(), 2U);
+    sem_t semaphore;
+    sem_init(&semaphore, 0, 1);
+    sem_wait(&semaphore);
+    EXPECT_EQ(counted(), 1U);
+    sem_destroy(&semaphore);
+    int word = 0;
+    EXPECT_EQ(syscall(SYS_futex, &word, FUTEX_WAIT_PRIVATE, 1, nullptr, nullptr, 0), -1) << "not what it waits for";
+    EXPECT_EQ(counted(), 1U);
+    EXPECT_EQ(syscall(SYS_futex, &word, FUTEX_WAKE_PRIVATE, 1, nullptr, nullptr, 0), 0);
+    EXPECT_EQ(counted(), 0U);
 }
 
 TEST_F(AllocationTest, TheCounterCountsEachThreadByItself) {
@@ -131,7 +199,7 @@ TEST_F(AllocationTest, TheCounterCountsEachThreadByItself) {
 }
 
 /// Everything that both threads do in steady playback, the event loop and the waking of it included.
-TEST_F(AllocationTest, SteadyPlaybackAllocatesNothingOnEitherThread) {
+TEST_F(AllocationTest, SteadyPlaybackAllocatesNothingOnEitherThreadAndTheDevicesWaitsForNobody) {
     struct Case {
         std::int32_t rate;
         std::int32_t channels;
@@ -153,30 +221,33 @@ TEST_F(AllocationTest, SteadyPlaybackAllocatesNothingOnEitherThread) {
         play(100);
         deviceAllocations = 0;
         devicePulls = 0;
+        deviceWaits = 0;
         driver->setProbe(countOnDevice);
         const std::int64_t framesBefore = SteadySource::framesTaken();
         const AllocationCount count;
         play(500);
         EXPECT_EQ(count.soFar(), 0U) << "on the main thread";
         EXPECT_EQ(deviceAllocations, 0U) << "on the device's thread";
+        EXPECT_EQ(deviceWaits, 0U) << "on the device's thread";
         EXPECT_GE(devicePulls, 499U);
         EXPECT_GT(SteadySource::framesTaken(), framesBefore + 100);
     }
 }
 
 /// The real output, into SDL's own stand-in for a device, and the real event loop.
-TEST_F(AllocationTest, APullOfSdlsDeviceAllocatesNothing) {
+TEST_F(AllocationTest, APullOfSdlsDeviceAllocatesNothingAndWaitsForNobody) {
     SteadySource::set(44100, 2, 1024);
     setAudioOutputDriver(std::make_shared<Counting<SdlAudioDriver>>("dummy"));
     AudioPlayback player;
     player.setSourceChangedCounter(1);
     ASSERT_TRUE(EventLoop::until([] { return devicePulls > 50; }));
     EXPECT_EQ(deviceAllocations, 0U);
+    EXPECT_EQ(deviceWaits, 0U);
     EXPECT_GT(SteadySource::framesTaken(), 10);
 }
 
 /// The real output, to a real sound server. What its client library allocates between pulls is its own affair.
-TEST_F(AllocationTest, APullOfASoundServersStreamAllocatesNothing) {
+TEST_F(AllocationTest, APullOfASoundServersStreamAllocatesNothingAndWaitsForNobody) {
     SoundServer server;
     ASSERT_TRUE(server.start());
     SteadySource::set(44100, 2, 1024);
@@ -185,5 +256,6 @@ TEST_F(AllocationTest, APullOfASoundServersStreamAllocatesNothing) {
     player.setSourceChangedCounter(1);
     ASSERT_TRUE(EventLoop::until([] { return devicePulls > 50; }));
     EXPECT_EQ(deviceAllocations, 0U);
+    EXPECT_EQ(deviceWaits, 0U);
     EXPECT_GT(SteadySource::framesTaken(), 10);
 }

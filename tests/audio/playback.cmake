@@ -22,7 +22,7 @@ add_library(qivo_steady_source STATIC SteadySource.cpp SteadySource.h)
 target_link_libraries(qivo_steady_source PUBLIC qivo_interface)
 add_library(qivo_allocation_count OBJECT AllocationCount.cpp AllocationCount.h)
 target_link_libraries(qivo_allocation_count PUBLIC qivo_options)
-qivo_test(test-audio-allocations SOURCES AllocationTest.cpp
+qivo_test(test-audio-allocations SOURCES AllocationTest.cpp WaitCount.cpp WaitCount.h
           LIBRARIES qivo_audio_player qivo_null_audio qivo_steady_source qivo_allocation_count qivo_sound_server
           ENVIRONMENT ${playback_environment})
 
