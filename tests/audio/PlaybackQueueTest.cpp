@@ -4,7 +4,6 @@
 
 #include "audio/AudioPlayback.h"
 #include "platform/NullAudioOutput.h"
-#include "platform/SdlAudioOutput.h"
 
 #include "tests/audio/LiveSource.h"
 #include "tests/audio/SoundAnalysis.h"
@@ -14,13 +13,11 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <atomic>
 #include <chrono>
 #include <cmath>
 #include <cstdint>
 #include <memory>
 #include <string>
-#include <thread>
 #include <utility>
 #include <vector>
 
@@ -77,36 +74,6 @@ class PlaybackQueueTest : public testing::Test {
     EventLoop loop;
     std::shared_ptr<NullAudioDriver> driver;
     std::unique_ptr<AudioPlayback> player;
-};
-
-/// SDL's stand-in for a device, behind which frames that are not silent are counted.
-class ListeningSdl : public SdlAudioDriver {
-  public:
-    explicit ListeningSdl(std::shared_ptr<std::atomic<int>> heard)
-        : SdlAudioDriver("dummy"), m_heard(std::move(heard)) {}
-
-    int open(const AudioStreamBasicDescription& format, std::shared_ptr<AudioSource> source,
-             std::unique_ptr<AudioOutput>& output) override {
-        return SdlAudioDriver::open(format, std::make_shared<Listener>(std::move(source), m_heard), output);
-    }
-
-  private:
-    class Listener : public AudioSource {
-      public:
-        Listener(std::shared_ptr<AudioSource> source, std::shared_ptr<std::atomic<int>> heard)
-            : m_source(std::move(source)), m_heard(std::move(heard)) {}
-        void pull(float* out, std::size_t floats) noexcept override {
-            m_source->pull(out, floats);
-            *m_heard += static_cast<int>(std::count(out, out + floats, 0.5F) / 2);
-        }
-        void stateChanged() noexcept override { m_source->stateChanged(); }
-
-      private:
-        const std::shared_ptr<AudioSource> m_source;
-        const std::shared_ptr<std::atomic<int>> m_heard;
-    };
-
-    const std::shared_ptr<std::atomic<int>> m_heard;
 };
 
 /// The first frame of the sound in interleaved stereo, in frames.
@@ -179,8 +146,9 @@ std::vector<Case> everyDevice() {
     for (const int rate : {44100, 48000}) {
         for (const int packet : {5, 10, 20, 40}) {
             for (const int burst : {1, 2, 3, 4}) {
-                for (const int latency : {0, 40}) {
-                    all.push_back({rate, packet, burst, latency});
+                all.push_back({rate, packet, burst, 0});
+                if (burst == 1 || burst == 4) {
+                    all.push_back({rate, packet, burst, 40});
                 }
             }
         }
@@ -294,26 +262,3 @@ TEST_P(ClocksThatDiffer, LatencyStaysBoundedForAnHourAndGrowsNoFurther) {
 INSTANTIATE_TEST_SUITE_P(PlaybackQueue, ClocksThatDiffer, testing::Values(-200, 0, 200), [](const auto& test) {
     return test.param < 0 ? "Slower" : test.param > 0 ? "Faster" : "Same";
 });
-
-// --- A real device's thread, in real time.
-
-TEST_F(PlaybackQueueTest, SdlsThreadAndThePlayersShareTheQueue) {
-    LiveSource::Script script;
-    script.sound.assign(2, 0.5F);
-    const auto begin = std::chrono::steady_clock::now();
-    script.now = [begin] { return std::chrono::steady_clock::now() - begin; };
-    script.pass = [](milliseconds time) { std::this_thread::sleep_for(time); };
-    LiveSource::set(std::move(script));
-    const auto heard = std::make_shared<std::atomic<int>>(0);
-    setAudioOutputDriver(std::make_shared<ListeningSdl>(heard));
-    AppData::inst()->setMute(false);
-    AppData::inst()->setQIVOSourceInfoNamed("A (1)", "u1");
-    for (int i = 0; i < 3; ++i) {
-        player = std::make_unique<AudioPlayback>();
-        player->setSourceChangedCounter(1);
-        *heard = 0;
-        EXPECT_TRUE(EventLoop::until([&] { return *heard > 48000 / 4; }));
-        player->setMute(true);
-        player->setMute(false);
-    }
-}

@@ -30,5 +30,8 @@ qivo_test(test-audio-allocations SOURCES AllocationTest.cpp WaitCount.cpp WaitCo
 add_library(qivo_live_source STATIC LiveSource.cpp LiveSource.h)
 target_link_libraries(qivo_live_source PUBLIC qivo_interface PRIVATE qivo_runtime_sound)
 qivo_test(test-playback-queue SOURCES PlaybackQueueTest.cpp
-          LIBRARIES qivo_audio_player qivo_null_audio qivo_live_source TSAN BUSY
+          LIBRARIES qivo_audio_player qivo_null_audio qivo_live_source BUSY
+          ENVIRONMENT ${playback_environment})
+qivo_test(test-sdl-playback SOURCES SdlPlaybackTest.cpp
+          LIBRARIES qivo_audio_player qivo_audio_queue qivo_live_source TSAN
           ENVIRONMENT ${playback_environment})
