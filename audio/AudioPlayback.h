@@ -43,7 +43,7 @@ class AudioPlayback {
     std::int32_t sourceChangedCounter() const { return _sourceChangedCounter; }
 
     /// Opens the queue on three buffers of silence. Without a queue nothing happens; if the queue does not start, the
-    /// player counts as playing all the same.
+    /// player counts as playing all the same. While there is a queue a second start does nothing.
     void startPlayback();
     /// Harmless when stopped.
     void stopPlayback();

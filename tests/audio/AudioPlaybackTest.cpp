@@ -23,6 +23,22 @@ using testing::StartsWith;
 
 namespace {
 
+bool noMemory = false;
+
+} // namespace
+
+extern "C" {
+
+void* __real_realloc(void* memory, std::size_t size); // NOLINT(bugprone-reserved-identifier): the linker's names
+
+void* __wrap_realloc(void* memory, std::size_t size) { // NOLINT(bugprone-reserved-identifier)
+    return noMemory ? nullptr : __real_realloc(memory, size);
+}
+
+} // extern "C"
+
+namespace {
+
 constexpr std::uint32_t kBufferBytes = 12800;
 
 /// A player bound to the model as the application's controller binds it, on a scripted queue and a scripted libqivo.
@@ -567,6 +583,53 @@ TEST_F(AudioPlaybackTest, ASourceThatBecomesStereoPlaysBothChannels) {
     }
 }
 
+TEST_F(AudioPlaybackTest, TheRightResamplerHasNotHeardTheMonoThatCameBefore) {
+    playPrimed();
+    for (int i = 0; i < 3; ++i) {
+        fake.addCapture(audioFrame(44100, {ramp(441, 0.9F, 0)}));
+        turn();
+        turn();
+    }
+    fake.addCapture(audioFrame(44100, {ramp(441, 0.9F, 0), ramp(441, -0.5F, 0)}));
+    turn();
+    const auto played = turn();
+    for (const float sample : channelOf(played.samples, 1)) {
+        EXPECT_NEAR(sample, -0.5F, 1e-6F);
+    }
+}
+
+TEST_F(AudioPlaybackTest, TheRightChannelSaysHowManyFramesThereAre) {
+    // What the two make of the same frames: the left one has a position that the right one, new to the stream, has not.
+    constexpr std::size_t kSamples = 100;
+    AudioResampler used;
+    AudioResampler fresh;
+    const auto yield = [](AudioResampler& resampler) {
+        std::vector<float> plane(kSamples, 0.5F);
+        std::vector<float> out(2 * kSamples);
+        resampler.setSourceSampleRate(44100, 48000);
+        SampleCursor src{plane.data(), plane.data() + plane.size()};
+        SampleCursor dst{out.data(), out.data() + out.size()};
+        resampler.processSrc(&src, &dst, 1, 1);
+        return static_cast<std::uint32_t>(dst.position - out.data());
+    };
+    playPrimed();
+    const auto play = [this](std::vector<std::vector<float>> channels) {
+        fake.addCapture(audioFrame(44100, channels));
+        turn();
+        const std::uint32_t frames = state().size() / 8;
+        turn();
+        return frames;
+    };
+    std::uint32_t left = 0;
+    const std::uint32_t right = yield(fresh);
+    // Mono until the two differ at the next frame.
+    for (AudioResampler next = used; (left = yield(next)) == right; next = used) {
+        EXPECT_EQ(play({ramp(kSamples, 0.5F, 0)}), yield(used));
+    }
+    ASSERT_NE(left, right);
+    EXPECT_EQ(play({ramp(kSamples, 0.5F, 0), ramp(kSamples, 0.5F, 0)}), right);
+}
+
 // --- Bad input: silence, no crash, and the next good frame plays.
 
 class AudioPlaybackBadFrameTest : public AudioPlaybackTest {
@@ -671,6 +734,26 @@ TEST_F(AudioPlaybackBadFrameTest, TheLargestNumberOfSamples) {
     auto bad = audioFrame(48000, {ramp(480, 0.9F, 0)});
     bad.audio.no_samples = std::numeric_limits<std::int32_t>::max();
     EXPECT_TRUE(isSilence(playBad(std::move(bad))));
+}
+
+TEST_F(AudioPlaybackBadFrameTest, AFrameForWhichThereIsNoMemory) {
+    playPrimed();
+    fake.addCapture(audioFrame(48000, {ramp(480, 0.5F, 0)}));
+    turn();
+    turn();
+    const float* const stage = state().stage();
+    const std::uint32_t capacity = state().capacity();
+    noMemory = true;
+    fake.addCapture(audioFrame(48000, {ramp(4800, 0.9F, 0)}));
+    turn();
+    noMemory = false;
+    EXPECT_EQ(fake.framesOut(), 0) << "given back";
+    EXPECT_EQ(state().stage(), stage) << "as it was";
+    EXPECT_EQ(state().capacity(), capacity);
+    EXPECT_EQ(state().size(), 0U);
+    fake.addCapture(audioFrame(48000, {ramp(4800, 0.25F, 0)}));
+    EXPECT_TRUE(isSilence(turn()));
+    EXPECT_EQ(turn().samples[0], 0.25F);
 }
 
 TEST_F(AudioPlaybackBadFrameTest, NotANumber) {
