@@ -36,7 +36,7 @@ constexpr std::ptrdiff_t kLongestOutput = 8 * kFrame; // samples of one channel
 /// What every contender reads and writes: small enough to stay in the cache, as a player's would.
 struct Sound {
     std::vector<float> planes = std::vector<float>(2 * kFrame);
-    std::vector<float> stereo = std::vector<float>(2 * kLongestOutput);
+    std::vector<float> stereo = std::vector<float>(2 * kLongestOutput + 1); // the right channel's region ends later
     std::vector<float> scratch = std::vector<float>(2 * kLongestOutput);
 
     Sound() {
@@ -78,7 +78,7 @@ Frame ours(int rate) {
             float* plane = sound.planes.data() + channel * kFrame;
             float* out = sound.stereo.data() + channel;
             SampleCursor src{plane, plane + kFrame};
-            SampleCursor dst{out, out + sound.stereo.size()};
+            SampleCursor dst{out, out + 2 * kLongestOutput};
             resampler.processSrc(&src, &dst, 1, 2);
             made = static_cast<int>(dst.position - out) / 2;
         }
