@@ -10,8 +10,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <functional>
-#include <iterator>
 #include <vector>
 
 namespace {
@@ -22,10 +20,7 @@ constexpr double kTarget = 1.05;
 constexpr int kDefaultRounds = 200;
 
 void report(const char* what, const std::vector<double>& work, const std::vector<double>& copy) {
-    // Of each turn by itself: a machine that slows down for a while slows both.
-    std::vector<double> ratios;
-    std::transform(work.begin(), work.end(), copy.begin(), std::back_inserter(ratios), std::divides<>());
-    const double ratio = median(ratios);
+    const double ratio = medianRatio(work, copy);
     std::printf("%-12s %8.0f us, memcpy %8.0f us, ratio %.3f (target at most %.2f)%s\n", what, median(work),
                 median(copy), ratio, kTarget, ratio <= kTarget ? "" : " MISSED");
 }

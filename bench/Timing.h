@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <chrono>
 #include <functional>
+#include <iterator>
+#include <utility>
 #include <vector>
 
 /// How long this takes.
@@ -16,4 +18,11 @@ inline double microseconds(const std::function<void()>& work) {
 inline double median(std::vector<double> values) {
     std::sort(values.begin(), values.end());
     return values[values.size() / 2];
+}
+
+/// The median of each turn's ratio by itself: a machine that slows down for a while slows both of them.
+inline double medianRatio(const std::vector<double>& work, const std::vector<double>& copy) {
+    std::vector<double> ratios;
+    std::transform(work.begin(), work.end(), copy.begin(), std::back_inserter(ratios), std::divides<>());
+    return median(std::move(ratios));
 }
