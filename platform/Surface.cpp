@@ -6,6 +6,7 @@
 #include <fcntl.h>
 #include <optional>
 #include <sys/mman.h>
+#include <sys/stat.h>
 #include <unistd.h>
 #include <utility>
 
@@ -45,10 +46,13 @@ FileDescriptor unnamedFile() {
     return file ? std::move(file) : FileDescriptor(::memfd_create("qivo-surface", flags));
 }
 
-/// One of this size, which it keeps; none if there is none to be had.
+/// One of this size, which it keeps; none if there is none to be had. Nobody may open it for writing: who has only a
+/// descriptor for reading could otherwise make one for writing of it.
 FileDescriptor sealedFile(std::size_t bytes) {
+    constexpr mode_t forReading = S_IRUSR | S_IRGRP | S_IROTH;
     FileDescriptor file = unnamedFile();
     const bool done = file && ::ftruncate(file.number(), static_cast<off_t>(bytes)) == 0 &&
+                      ::fchmod(file.number(), forReading) == 0 &&
                       ::fcntl(file.number(), F_ADD_SEALS, IOSurface::seals) == 0;
     return done ? std::move(file) : FileDescriptor();
 }

@@ -75,7 +75,9 @@ std::uint64_t IOSurfaceGetBytesPerElementOfPlane(IOSurfaceRef surface, std::uint
 std::uint64_t IOSurfaceGetBytesPerRowOfPlane(IOSurfaceRef surface, std::uint64_t plane);
 void* IOSurfaceGetBaseAddressOfPlane(IOSurfaceRef surface, std::uint64_t plane);
 
-/// Who receives a surface may always read, and write too if it is handed over so.
+/// Who receives a surface may always read, and write too if it is handed over so. Handed over for reading, the memory
+/// cannot be written by processes of other users. A process of the same user, or of the superuser, is trusted not to:
+/// it could change the memory's permissions, or reach into this process.
 enum class SurfaceAccess { readOnly, readWrite };
 
 /// Hands a surface to the process at the other end of a Unix socket, datagram, seqpacket or stream, which shares its

@@ -41,8 +41,16 @@ std::string systemError(const char* what) {
     return std::string(what) + ": " + std::generic_category().message(errno);
 }
 
-/// The file opened once more for reading alone: what a descriptor permits goes with it.
+bool isWritable(const FileDescriptor& file) {
+    return (::fcntl(file.number(), F_GETFL) & O_ACCMODE) == O_RDWR;
+}
+
+/// A descriptor of the file for reading alone: what a descriptor permits goes with it. One that permits no more is
+/// good as it is, and its maker may not let it be opened once more.
 FileDescriptor readOnly(const FileDescriptor& file) {
+    if (!isWritable(file)) {
+        return FileDescriptor(::fcntl(file.number(), F_DUPFD_CLOEXEC, 0));
+    }
     const std::string path = "/proc/self/fd/" + std::to_string(file.number());
     return FileDescriptor(::open(path.c_str(), O_RDONLY | O_CLOEXEC));
 }
@@ -152,7 +160,7 @@ std::shared_ptr<IOSurface> IOSurfaceReceive(int socket, std::string& error) {
     if (!error.empty()) {
         return nullptr;
     }
-    const bool writable = (::fcntl(file.number(), F_GETFL) & O_ACCMODE) == O_RDWR;
+    const bool writable = isWritable(file);
     SharedMapping mapping(file, IOSurface::fileBytes(message.layout), writable);
     if (!mapping.memory()) {
         error = systemError("Mapping a surface");

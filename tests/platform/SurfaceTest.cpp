@@ -9,8 +9,12 @@
 #include <cerrno>
 #include <cstring>
 #include <fcntl.h>
+#include <functional>
 #include <limits>
+#include <linux/capability.h>
 #include <sys/mman.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
 #include <thread>
 #include <unistd.h>
 
@@ -308,6 +312,47 @@ TEST_F(SurfaceTransfer, ForReadingCannotBeLockedForWriting) {
     EXPECT_EQ(IOSurfaceLock(received.get(), kIOSurfaceLockReadOnly, &seed), kIOReturnSuccess);
     EXPECT_THAT(bytesOf(received.get()), Each(0));
     EXPECT_EQ(IOSurfaceUnlock(received.get(), kIOSurfaceLockReadOnly, nullptr), kIOReturnSuccess);
+}
+
+/// Does something in a thread for which permissions count, whoever runs the tests.
+void withoutPrivileges(const std::function<void()>& work) {
+    std::thread([&] {
+        __user_cap_header_struct version{.version = _LINUX_CAPABILITY_VERSION_3, .pid = 0};
+        __user_cap_data_struct none[_LINUX_CAPABILITY_U32S_3] = {}; // NOLINT(modernize-avoid-c-arrays): the system's
+        ASSERT_EQ(::syscall(SYS_capset, &version, static_cast<void*>(none)), 0);
+        work();
+    }).join();
+}
+
+FileDescriptor openedOnceMore(int file, int access) {
+    return FileDescriptor(::open(("/proc/self/fd/" + std::to_string(file)).c_str(), access | O_CLOEXEC));
+}
+
+TEST_F(SurfaceTransfer, ForReadingCannotBeOpenedForWriting) {
+    const auto received = transferred(SurfaceAccess::readOnly);
+    ASSERT_TRUE(received) << error;
+    const int file = IOSurfaceGetDescriptor(received.get());
+    withoutPrivileges([&] {
+        EXPECT_TRUE(openedOnceMore(file, O_RDONLY));
+        for (const int access : {O_RDWR, O_WRONLY}) {
+            errno = 0;
+            EXPECT_FALSE(openedOnceMore(file, access)) << access;
+            EXPECT_EQ(errno, EACCES);
+        }
+    });
+}
+
+TEST_F(SurfaceTransfer, ForReadingCanBeSentOnWhereItCannotBeOpenedAtAll) {
+    const auto received = transferred(SurfaceAccess::readOnly);
+    ASSERT_TRUE(received) << error;
+    ASSERT_EQ(::fchmod(IOSurfaceGetDescriptor(sent.get()), 0), 0);
+    withoutPrivileges([&] {
+        EXPECT_FALSE(openedOnceMore(IOSurfaceGetDescriptor(received.get()), O_RDONLY));
+        EXPECT_TRUE(IOSurfaceSend(socket.here(), received.get(), SurfaceAccess::readOnly, error)) << error;
+    });
+    const auto third = IOSurfaceReceive(socket.there(), error);
+    ASSERT_TRUE(third) << error;
+    EXPECT_EQ(IOSurfaceLock(third.get(), 0, nullptr), kIOReturnNotWritable);
 }
 
 TEST_F(SurfaceTransfer, CanBeSentOn) {
