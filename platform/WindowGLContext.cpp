@@ -36,6 +36,9 @@ std::shared_ptr<WindowGLContext> WindowGLContext::create(QWindow& window, const 
                 qPrintable(nameOf(wanted)), qPrintable(nameOf(offered)));
         return nullptr;
     }
+    if (!QOpenGLContext::supportsThreadedOpenGL()) {
+        logLine(">> MESSAGE[%d]: OpenGL is not made for several threads on this display, the picture may fail!", 0);
+    }
     return context;
 }
 
