@@ -62,9 +62,9 @@ class CGImage {
     static std::shared_ptr<const CGImage> create(const CGImageLayout& layout, const void* pixels, std::uint64_t bytes,
                                                  std::shared_ptr<const void> owner = nullptr);
 
-    /// The picture of a bitmap in one plane, or null. Pixels without alpha are wrapped: the bitmap must outlive the
-    /// picture. Those with alpha are copied and multiplied by it, to the nearest, as drawing needs them. Components are
-    /// R, G, B, alpha; those of 16 bits are in the machine's byte order.
+    /// The picture of a bitmap in one plane, or null. Pixels without alpha, or with it multiplied in already, are
+    /// wrapped: the bitmap must outlive the picture. Others are copied and multiplied by their alpha, to the nearest,
+    /// as drawing needs them. Components are R, G, B, alpha; those of 16 bits are in the machine's byte order.
     static std::shared_ptr<const CGImage> imageWithBitmap(const BitmapImageRep* bitmap);
 
     CGImage(const CGImageLayout& layout, const std::byte* pixels, std::shared_ptr<const void> owner)
@@ -79,23 +79,24 @@ class CGImage {
     std::shared_ptr<const void> _owner;
 };
 
+// A null picture is allowed: it has no size, no bits and no alpha.
 inline std::uint64_t CGImageGetWidth(CGImageRef image) {
-    return image->layout().width;
+    return image ? image->layout().width : 0;
 }
 inline std::uint64_t CGImageGetHeight(CGImageRef image) {
-    return image->layout().height;
+    return image ? image->layout().height : 0;
 }
 inline std::uint64_t CGImageGetBitsPerComponent(CGImageRef image) {
-    return image->layout().bitsPerComponent;
+    return image ? image->layout().bitsPerComponent : 0;
 }
 inline std::uint64_t CGImageGetBitsPerPixel(CGImageRef image) {
-    return image->layout().bitsPerPixel;
+    return image ? image->layout().bitsPerPixel : 0;
 }
 inline CGBitmapInfo CGImageGetBitmapInfo(CGImageRef image) {
-    return image->layout().bitmapInfo;
+    return image ? image->layout().bitmapInfo : kCGImageAlphaNone;
 }
 inline CGBitmapInfo CGImageGetAlphaInfo(CGImageRef image) {
-    return image->layout().alphaInfo();
+    return image ? image->layout().alphaInfo() : kCGImageAlphaNone;
 }
 
 } // namespace qivo

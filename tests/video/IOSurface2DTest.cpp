@@ -308,6 +308,15 @@ TEST_F(IOSurface2DTest, LoadersTakeNull) {
     EXPECT_EQ(IOSurface2D::surfaceWithResource(nullptr)->surface(), nullptr);
 }
 
+TEST_F(IOSurface2DTest, NoPictureHasNeitherSizeNorBits) {
+    EXPECT_EQ(CGImageGetWidth(nullptr), 0U);
+    EXPECT_EQ(CGImageGetHeight(nullptr), 0U);
+    EXPECT_EQ(CGImageGetBitsPerComponent(nullptr), 0U);
+    EXPECT_EQ(CGImageGetBitsPerPixel(nullptr), 0U);
+    EXPECT_EQ(CGImageGetBitmapInfo(nullptr), kCGImageAlphaNone);
+    EXPECT_EQ(CGImageGetAlphaInfo(nullptr), kCGImageAlphaNone);
+}
+
 TEST_F(IOSurface2DTest, EveryLoaderReadsAPicture) {
     const ResourceDirectory directory;
     QImage picture(3, 2, QImage::Format_RGBA8888);
