@@ -6,6 +6,8 @@
 
 namespace qivo {
 
+class PixelFormat;
+
 /// When a refresh was begun, on the steady clock.
 struct TimeStamp {
     std::chrono::steady_clock::time_point hostTime;
@@ -27,8 +29,9 @@ class DisplayLink {
 
     /// To be set before start().
     virtual void setOutputCallback(OutputCallback callback, void* context) = 0;
-    /// Follows the display that the context's drawable is on, also when it goes to another one.
-    virtual void setCurrentDisplayFromContext(const GLContext& context) = 0;
+    /// Follows the display that the context's drawable is on, also when it goes to another one. The format has no
+    /// effect: the context knows its display.
+    virtual void setCurrentDisplayFromContext(const GLContext& context, const PixelFormat& format) = 0;
     /// Does nothing if it runs already or has no callback.
     virtual void start() = 0;
     /// Does nothing if it does not run. Waits for a callback that is under way; no callback runs after it returns.

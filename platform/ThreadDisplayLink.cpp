@@ -17,7 +17,7 @@ void ThreadDisplayLink::setOutputCallback(OutputCallback callback, void* context
     m_context = context;
 }
 
-void ThreadDisplayLink::setCurrentDisplayFromContext(const GLContext& context) {
+void ThreadDisplayLink::setCurrentDisplayFromContext(const GLContext& context, const PixelFormat& /*format*/) {
     m_display = context.display();
 }
 

@@ -18,7 +18,7 @@ class ThreadDisplayLink final : public DisplayLink {
     ~ThreadDisplayLink() override;
 
     void setOutputCallback(OutputCallback callback, void* context) override;
-    void setCurrentDisplayFromContext(const GLContext& context) override;
+    void setCurrentDisplayFromContext(const GLContext& context, const PixelFormat& format) override;
     void start() override;
     /// From within the callback, it lets that callback be the last one and returns without waiting for it.
     void stop() override;

@@ -85,7 +85,7 @@ void VideoView::startDisplayLink() {
     displayLink = newDisplayLink();
     if (displayLink) {
         displayLink->setOutputCallback(MyDisplayLinkCallback, this);
-        displayLink->setCurrentDisplayFromContext(*openGLContext());
+        displayLink->setCurrentDisplayFromContext(*openGLContext(), OpenGLView::defaultPixelFormat());
         displayLink->start();
     }
 }

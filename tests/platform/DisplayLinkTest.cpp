@@ -1,6 +1,7 @@
 #include "platform/ThreadDisplayLink.h"
 
 #include "platform/FairLock.h"
+#include "platform/PixelFormat.h"
 
 #include <atomic>
 #include <ctime>
@@ -54,7 +55,7 @@ class DisplayLinkTest : public testing::Test {
 
     void SetUp() override {
         link.setOutputCallback(call, this);
-        link.setCurrentDisplayFromContext(display);
+        link.setCurrentDisplayFromContext(display, PixelFormat::initWithAttributes({0}));
     }
     void TearDown() override { link.stop(); }
 

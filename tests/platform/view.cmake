@@ -1,4 +1,4 @@
 qivo_test(RefreshPacerTest SOURCES RefreshPacerTest.cpp LIBRARIES qivo_platform_link)
 qivo_test(FairLockTest SOURCES FairLockTest.cpp LIBRARIES qivo_platform_link TSAN)
-qivo_test(DisplayLinkTest SOURCES DisplayLinkTest.cpp LIBRARIES qivo_platform_link TSAN SERIAL)
+qivo_test(DisplayLinkTest SOURCES DisplayLinkTest.cpp LIBRARIES qivo_platform_view TSAN SERIAL)
 qivo_test(PixelFormatTest SOURCES PixelFormatTest.cpp LIBRARIES qivo_platform_view)

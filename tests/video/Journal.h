@@ -3,6 +3,7 @@
 #include "platform/DisplayLink.h"
 #include "platform/FairLock.h"
 #include "platform/GLContext.h"
+#include "platform/PixelFormat.h"
 #include "tests/fake/FakeQivo.h"
 #include "tests/gl/RecordingGL.h"
 
@@ -88,9 +89,10 @@ class JournalLink final : public DisplayLink {
         m_callback = callback;
         m_context = context;
     }
-    void setCurrentDisplayFromContext(const GLContext& context) override {
+    void setCurrentDisplayFromContext(const GLContext& context, const PixelFormat& format) override {
         m_journal.add("link display");
         followed = &context;
+        followedFormat = format.attributes();
     }
     void start() override {
         m_journal.add("link start");
@@ -104,6 +106,7 @@ class JournalLink final : public DisplayLink {
     int refresh() { return m_callback(this, {}, m_context); }
 
     const GLContext* followed = nullptr;
+    std::vector<std::uint32_t> followedFormat;
 
   private:
     Journal& m_journal;

@@ -65,6 +65,7 @@ TEST_F(VideoViewTest, PreparesInThisOrder) {
     EXPECT_THAT(lines, Contains(call("glGenVertexArrays", 1)));
     EXPECT_THAT(lines, Not(Contains(StartsWith("glGenTextures"))));
     EXPECT_EQ(view->link->followed, context.get());
+    EXPECT_THAT(view->link->followedFormat, ElementsAre(0)) << "not the format that the view itself asks for";
     EXPECT_TRUE(view->wantsBestResolutionOpenGLSurface());
 }
 
