@@ -82,7 +82,8 @@ std::shared_ptr<const CGImage> CGImage::imageWithBitmap(const BitmapImageRep* bi
     const auto wrapped = create(layout, bitmap->bitmapData(), layout.bytesPerRow * layout.height);
     const bool isColourWithAlpha = layout.bitsPerPixel == 4 * layout.bitsPerComponent &&
                                    (layout.bitsPerComponent == 8 || layout.bitsPerComponent == 16);
-    return wrapped && bitmap->hasAlpha() && isColourWithAlpha ? multipliedImage(layout, bitmap->bitmapData()) : wrapped;
+    const bool isToBeMultiplied = bitmap->hasAlpha() && !bitmap->isPremultiplied() && isColourWithAlpha;
+    return wrapped && isToBeMultiplied ? multipliedImage(layout, bitmap->bitmapData()) : wrapped;
 }
 
 } // namespace qivo

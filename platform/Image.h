@@ -30,7 +30,8 @@ struct BitmapLayout {
     std::int32_t pixelsHigh = 0;
     std::int32_t bitsPerSample = 8;
     std::int32_t samplesPerPixel = 4; ///< alpha included
-    bool hasAlpha = true;             ///< the last sample is alpha, not multiplied into the others
+    bool hasAlpha = true;             ///< the last sample is alpha
+    bool isPremultiplied = false;     ///< the alpha is multiplied into the other samples
     bool isPlanar = false;            ///< each sample has a plane of its own
     std::int32_t bytesPerRow = 0;     ///< of one plane, padding included
 
@@ -59,6 +60,7 @@ class BitmapImageRep : public ImageRep {
     std::int32_t bitsPerSample() const { return _layout.bitsPerSample; }
     std::int32_t samplesPerPixel() const { return _layout.samplesPerPixel; }
     bool hasAlpha() const { return _layout.hasAlpha; }
+    bool isPremultiplied() const { return _layout.isPremultiplied; }
     bool isPlanar() const { return _layout.isPlanar; }
     std::int32_t bytesPerRow() const { return _layout.bytesPerRow; }
 

@@ -143,6 +143,7 @@ void VideoView::replaceTexture(const QIVOlib_video_frame_v2_t& frame) {
     layout.bitsPerSample = 8;
     layout.samplesPerPixel = 4;
     layout.hasAlpha = true;
+    layout.isPremultiplied = true;
     layout.isPlanar = false;
     layout.bytesPerRow = frame.line_stride_in_bytes;
     const auto rep = std::make_shared<BitmapImageRep>(layout, BitmapImageRep::Planes{frame.p_data});

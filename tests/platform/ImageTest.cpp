@@ -24,6 +24,7 @@ TEST(BitmapImageRep, ReportsTheLayoutAsGiven) {
                               .bitsPerSample = 16,
                               .samplesPerPixel = 5,
                               .hasAlpha = false,
+                              .isPremultiplied = true,
                               .isPlanar = true,
                               .bytesPerRow = 7};
     const BitmapImageRep bitmap(layout, {});
@@ -33,6 +34,7 @@ TEST(BitmapImageRep, ReportsTheLayoutAsGiven) {
     EXPECT_EQ(bitmap.bitsPerSample(), 16);
     EXPECT_EQ(bitmap.samplesPerPixel(), 5);
     EXPECT_FALSE(bitmap.hasAlpha());
+    EXPECT_TRUE(bitmap.isPremultiplied());
     EXPECT_TRUE(bitmap.isPlanar());
     EXPECT_EQ(bitmap.bytesPerRow(), 7);
     EXPECT_EQ(bitmap.bitmapData(), nullptr);
@@ -43,6 +45,7 @@ TEST(BitmapImageRep, IsByDefaultFour8BitSamplesWithAlphaInOnePlane) {
     EXPECT_EQ(layout.bitsPerSample, 8);
     EXPECT_EQ(layout.samplesPerPixel, 4);
     EXPECT_TRUE(layout.hasAlpha);
+    EXPECT_FALSE(layout.isPremultiplied);
     EXPECT_FALSE(layout.isPlanar);
 }
 

@@ -373,6 +373,16 @@ TEST_F(IOSurface2DTest, BitmapThatCannotBeSoGivesNone) {
     }
 }
 
+TEST_F(IOSurface2DTest, AlphaIsMultipliedInOnceAtMost) {
+    const Bytes pixels = {200, 100, 50, 128};
+    BitmapLayout layout{.pixelsWide = 1, .pixelsHigh = 1, .bytesPerRow = 4};
+    const Image straight = pictureOf(layout, pixels.data());
+    EXPECT_THAT(bytesOf(*IOSurface2D::initWithImage(&straight)), ElementsAre(100, 50, 25, 128));
+    layout.isPremultiplied = true;
+    const Image multiplied = pictureOf(layout, pixels.data());
+    EXPECT_THAT(bytesOf(*IOSurface2D::initWithImage(&multiplied)), ElementsAre(200, 100, 50, 128));
+}
+
 TEST_F(IOSurface2DTest, UpdateReplacesAllPixels) {
     const auto surface = acquired(32, 3, 2);
     Bytes pixels(24);
