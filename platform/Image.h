@@ -87,7 +87,8 @@ class Image {
 
     /// Decodes a picture file into one bitmap in the file's own precision: 8 or 16 bits, 3 samples, or 4 where the
     /// file has an alpha channel. Palettes become colours; a grey picture without alpha keeps its single sample. A file
-    /// that is missing, broken, larger than `maximumPixels` or not a regular file gives null; so does a null path.
+    /// that is missing, broken, larger than `maximumPixels`, not a regular file or not of pixels, such as a drawing of
+    /// lines, gives null; so does a null path.
     ///
     /// A 16-bit bitmap may be read for twice its size: behind it lie as many zero bytes as it has itself (see
     /// GLTexture::initWithImage).

@@ -5,9 +5,12 @@
 #include <QImage>
 #include <QImageReader>
 
+#include <algorithm>
 #include <cstring>
 #include <filesystem>
+#include <iterator>
 #include <string>
+#include <string_view>
 #include <system_error>
 #include <utility>
 
@@ -19,6 +22,13 @@ bool isTooLarge(QSize size) {
     return static_cast<std::int64_t>(size.width()) * size.height() > Image::maximumPixels;
 }
 
+/// Formats of pixels. A plugin of the toolkit may draw others, in a size and at a cost that the file decides.
+bool isOfPixels(const QByteArray& format) {
+    constexpr std::string_view known[] = {"bmp", "dib", "gif", "icns", "ico",  "jpeg", "jpg",  "pbm", "pgm",
+                                          "png", "ppm", "tga", "tif",  "tiff", "wbmp", "webp", "xbm", "xpm"};
+    return std::find(std::begin(known), std::end(known), format.toStdString()) != std::end(known);
+}
+
 QImage decoded(const char* path) {
     std::error_code error;
     if (!path || !std::filesystem::is_regular_file(path, error)) {
@@ -28,7 +38,7 @@ QImage decoded(const char* path) {
     QImageReader::setAllocationLimit(static_cast<int>(Image::maximumPixels * 8 >> 20));
     QImageReader reader(QFile::decodeName(path));
     reader.setDecideFormatFromContent(true);
-    if (isTooLarge(reader.size())) {
+    if (!isOfPixels(reader.format()) || isTooLarge(reader.size())) {
         return {};
     }
     QImage image = reader.read();

@@ -6,6 +6,10 @@
 #include <gtest/gtest.h>
 
 #include <QImage>
+#include <QImageIOHandler>
+#include <QImageIOPlugin>
+#include <QImageReader>
+#include <QtPlugin>
 
 #include <algorithm>
 #include <cstring>
@@ -13,6 +17,41 @@
 #include <iterator>
 #include <sys/stat.h>
 #include <vector>
+
+namespace {
+
+/// Draws whatever begins as a drawing of lines does, as a plugin of the toolkit would.
+class DrawingHandler final : public QImageIOHandler {
+  public:
+    bool canRead() const override { return device() != nullptr && device()->peek(4) == "<svg"; }
+    bool read(QImage* image) override {
+        *image = QImage(3, 2, QImage::Format_RGBA8888);
+        image->fill(Qt::red);
+        return canRead();
+    }
+};
+
+} // namespace
+
+class DrawingPlugin final : public QImageIOPlugin {
+    Q_OBJECT
+    Q_PLUGIN_METADATA(IID QImageIOHandlerFactoryInterface_iid FILE "DrawingPlugin.json")
+
+  public:
+    Capabilities capabilities(QIODevice* device, const QByteArray& format) const override {
+        return format == "svg" || (device != nullptr && device->isReadable() && device->peek(4) == "<svg")
+                   ? CanRead
+                   : Capabilities();
+    }
+    QImageIOHandler* create(QIODevice* device, const QByteArray& format) const override {
+        auto* handler = new DrawingHandler; // NOLINT(cppcoreguidelines-owning-memory): the caller's
+        handler->setDevice(device);
+        handler->setFormat(format.isEmpty() ? QByteArray("svg") : format);
+        return handler;
+    }
+};
+
+Q_IMPORT_PLUGIN(DrawingPlugin)
 
 namespace qivo {
 namespace {
@@ -180,6 +219,13 @@ TEST_F(ImageDecoding, OfATextIsNull) {
     EXPECT_EQ(Image::imageWithContentsOfFile(directory.write("picture.png", "no picture").c_str()), nullptr);
 }
 
+TEST_F(ImageDecoding, OfADrawingOfLinesIsNullEvenIfThereIsAPluginForIt) {
+    const std::string path = directory.write("drawing.svg", "<svg/>");
+    ASSERT_FALSE(QImageReader(QString::fromStdString(path)).read().isNull());
+    EXPECT_EQ(Image::imageWithContentsOfFile(path.c_str()), nullptr);
+    EXPECT_EQ(Image::imageWithContentsOfFile(directory.write("drawing.png", "<svg/>").c_str()), nullptr);
+}
+
 TEST_F(ImageDecoding, OfACutFileIsNull) {
     const auto whole = directory.path("whole.png");
     ASSERT_TRUE(filled(QImage::Format_RGBA8888, Qt::red, 64, 64).save(QString::fromStdString(whole)));
@@ -228,3 +274,5 @@ TEST_F(ImageDecoding, RefusesOtherUrls) {
 
 } // namespace
 } // namespace qivo
+
+#include "ImageDecodingTest.moc"
