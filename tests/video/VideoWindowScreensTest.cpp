@@ -1,11 +1,24 @@
-// A window that goes from one screen to another, where the scale differs.
+// A window that goes from one screen to another, where scale and refresh rate differ.
 
 #include "tests/support/Process.h"
 #include "tests/video/WindowFixture.h"
 #include "video/LetterBox.h"
 
 #include <QAction>
+#include <QScreen>
 #include <cstdlib>
+
+namespace {
+
+double leftRate = 75;
+constexpr double kRightRate = 50;
+
+} // namespace
+
+/// In the place of the toolkit's, which gives all screens of a virtual X server the same rate.
+qreal QScreen::refreshRate() const {
+    return name() == QLatin1String("left") ? leftRate : kRightRate;
+}
 
 namespace qivo::test {
 namespace {
@@ -64,6 +77,27 @@ TEST_F(VideoWindowScreensTest, ThePictureFillsThePixelsOfTheOtherScreen) {
     screen->move(*screen->findWindow(kTitle), 100, 100);
     ASSERT_TRUE(runUntil([&] { return view->devicePixelRatioF() == 1; }));
     EXPECT_TRUE(runUntil([&] { return fits(); }));
+}
+
+TEST_F(VideoWindowScreensTest, TheLinkFollowsTheRefreshRateOfTheScreenThatTheWindowIsOn) {
+    showRed(401, 433);
+    QScreen* left = view->screen();
+    const auto display = view->openGLContext()->display();
+    EXPECT_EQ(display->rate, leftRate);
+    std::uint32_t generation = display->generation;
+    moveRight();
+    EXPECT_TRUE(runUntil([&] { return display->rate == kRightRate; })) << display->rate;
+    EXPECT_NE(display->generation, generation);
+    leftRate = 30;
+    emit left->refreshRateChanged(leftRate);
+    EXPECT_EQ(display->rate, kRightRate) << "what happens to the screen that it left is nothing to it";
+    screen->move(*screen->findWindow(kTitle), 100, 100);
+    EXPECT_TRUE(runUntil([&] { return display->rate == leftRate; })) << display->rate;
+    generation = display->generation;
+    leftRate = 75;
+    emit left->refreshRateChanged(leftRate);
+    EXPECT_EQ(display->rate, leftRate);
+    EXPECT_NE(display->generation, generation);
 }
 
 TEST_F(VideoWindowScreensTest, ShortcutsWorkAfterAClickOnTheOtherScreen) {
