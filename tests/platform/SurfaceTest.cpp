@@ -346,10 +346,12 @@ TEST_F(SurfaceTransfer, ForReadingCanBeSentOnWhereItCannotBeOpenedAtAll) {
     const auto received = transferred(SurfaceAccess::readOnly);
     ASSERT_TRUE(received) << error;
     ASSERT_EQ(::fchmod(IOSurfaceGetDescriptor(sent.get()), 0), 0);
+    bool sentOn = false;
     withoutPrivileges([&] {
         EXPECT_FALSE(openedOnceMore(IOSurfaceGetDescriptor(received.get()), O_RDONLY));
-        EXPECT_TRUE(IOSurfaceSend(socket.here(), received.get(), SurfaceAccess::readOnly, error)) << error;
+        sentOn = IOSurfaceSend(socket.here(), received.get(), SurfaceAccess::readOnly, error);
     });
+    ASSERT_TRUE(sentOn) << error;
     const auto third = IOSurfaceReceive(socket.there(), error);
     ASSERT_TRUE(third) << error;
     EXPECT_EQ(IOSurfaceLock(third.get(), 0, nullptr), kIOReturnNotWritable);
