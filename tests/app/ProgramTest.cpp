@@ -49,6 +49,24 @@ class ProgramTest : public testing::Test {
         return eventually([&] { return screen->findWindow("QIVO Viewer").has_value(); });
     }
 
+    /// How many texts of the driver's, about shaders and programs, it has logged.
+    static int errorsOfGL(const Process& program) {
+        const std::string errors = program.errors();
+        int count = 0;
+        for (auto at = errors.find(">> ERROR: {"); at != std::string::npos; at = errors.find(">> ERROR: {", at + 1)) {
+            ++count;
+        }
+        return count;
+    }
+
+    /// Its menus and shortcuts do, and it ends as it should.
+    void expectThatItWorks(Process& program) const {
+        screen->activate(*screen->findWindow("QIVO Viewer"));
+        EXPECT_TRUE(eventually([&] { return screen->key("Control+q") && !program.running(); }));
+        EXPECT_EQ(program.wait(kSoon), 0);
+        EXPECT_THAT(saved(), HasSubstr("ORVQIVOViewer_mute=false"));
+    }
+
     std::string saved() const {
         std::ifstream file(preferences());
         return {std::istreambuf_iterator<char>(file), {}};
@@ -178,6 +196,31 @@ TEST_F(ProgramTest, LibqivoThatRefusesToStartIsNamed) {
     EXPECT_THAT(program->errors(), HasSubstr("libqivo cannot be used: libqivo.so refused to start\n"));
     program->signal(SIGTERM);
     EXPECT_EQ(program->wait(kSoon), 0);
+}
+
+TEST_F(ProgramTest, WithoutShadersItNamesThemAndItsWindowWorks) {
+    ASSERT_FALSE(std::filesystem::exists(folder.path("share")));
+    const auto program = startWithLibrary();
+    ASSERT_TRUE(waitForWindow());
+    ASSERT_TRUE(eventually([&] { return errorsOfGL(*program) == 1; })) << program->errors();
+    for (const std::string shader : {"Quad2D.vs", "Quad2D.fs"}) {
+        EXPECT_THAT(program->errors(),
+                    AllOf(HasSubstr(">> " + folder.path("share/qivo-viewer/" + shader) + ": No such file or directory"),
+                          HasSubstr(">> ERROR: Failed acquiring sources from the \"" + shader + "'")));
+    }
+    expectThatItWorks(*program);
+}
+
+TEST_F(ProgramTest, WithBrokenShadersItShowsWhatIsWrongAndItsWindowWorks) {
+    std::filesystem::create_directories(folder.path("share/qivo-viewer"));
+    for (const auto& entry : std::filesystem::directory_iterator(SHADERS)) {
+        folder.write("share/qivo-viewer/" + entry.path().filename().string(), "nonsense\n");
+    }
+    const auto program = startWithLibrary();
+    ASSERT_TRUE(waitForWindow());
+    EXPECT_TRUE(eventually([&] { return errorsOfGL(*program) == 3; })) << program->errors();
+    EXPECT_THAT(program->errors(), Not(HasSubstr("Failed acquiring")));
+    expectThatItWorks(*program);
 }
 
 TEST_F(ProgramTest, WithoutDisplayItEndsWithOneLine) {
