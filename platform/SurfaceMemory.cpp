@@ -5,6 +5,20 @@
 #include <unistd.h>
 #include <utility>
 
+#if defined(__SANITIZE_ADDRESS__)
+#define QIVO_ADDRESS_SANITIZER
+#elif defined(__has_feature)
+#if __has_feature(address_sanitizer)
+#define QIVO_ADDRESS_SANITIZER
+#endif
+#endif
+#ifdef QIVO_ADDRESS_SANITIZER
+#include <sanitizer/asan_interface.h>
+#else
+#define ASAN_POISON_MEMORY_REGION(address, bytes) (static_cast<void>(address), static_cast<void>(bytes))
+#define ASAN_UNPOISON_MEMORY_REGION(address, bytes) (static_cast<void>(address), static_cast<void>(bytes))
+#endif
+
 namespace qivo {
 
 namespace {
@@ -48,7 +62,14 @@ std::size_t IOSurface::fileBytes(const SurfaceLayout& layout) {
 }
 
 IOSurface::IOSurface(const SurfaceLayout& layout, FileDescriptor file, SharedMapping mapping, bool writable)
-    : _layout(layout), _file(std::move(file)), _mapping(std::move(mapping)), _writable(writable) {}
+    : _layout(layout), _file(std::move(file)), _mapping(std::move(mapping)), _writable(writable) {
+    ASAN_POISON_MEMORY_REGION(base() + _layout.allocSize, fileBytes(_layout) - _layout.allocSize);
+    ASAN_UNPOISON_MEMORY_REGION(&sharedSeed(), sizeof sharedSeed());
+}
+
+IOSurface::~IOSurface() {
+    ASAN_UNPOISON_MEMORY_REGION(base(), fileBytes(_layout)); // other memory may lie there next
+}
 
 std::atomic<std::uint32_t>& IOSurface::sharedSeed() const {
     static_assert(std::atomic<std::uint32_t>::is_always_lock_free && sizeof(std::atomic<std::uint32_t>) == 4);

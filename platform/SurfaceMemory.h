@@ -38,8 +38,12 @@ class IOSurface {
     static std::size_t pixelBytes(const SurfaceLayout& layout);
     static std::size_t fileBytes(const SurfaceLayout& layout);
 
-    /// The layout must be sound, and the mapping as large as it asks for.
+    /// The layout must be sound, and the mapping as large as it asks for. In builds with the address sanitizer, what
+    /// lies behind the pixels cannot be touched, save the seed: the system maps whole pages, and would let it pass.
     IOSurface(const SurfaceLayout& layout, FileDescriptor file, SharedMapping mapping, bool writable);
+    ~IOSurface();
+    IOSurface(const IOSurface&) = delete;
+    IOSurface& operator=(const IOSurface&) = delete;
 
     const SurfaceLayout& layout() const { return _layout; }
     const FileDescriptor& file() const { return _file; }

@@ -74,15 +74,19 @@ std::shared_ptr<IOSurface> created(Numbers& numbers) {
                           : nullptr;
 }
 
-/// Every byte of every plane, twice: as the plane is written and as it is read.
+/// Every byte of every plane, each of which must lie within the surface's memory.
 void touch(IOSurfaceRef surface) {
     for (std::uint64_t plane = 0; plane < 6; ++plane) {
         auto* base = static_cast<unsigned char*>(IOSurfaceGetBaseAddressOfPlane(surface, plane));
         const auto bytes = IOSurfaceGetBytesPerRowOfPlane(surface, plane) * IOSurfaceGetHeightOfPlane(surface, plane);
-        if ((base == nullptr) != (bytes == 0) || bytes > IOSurfaceGetAllocSize(surface)) {
+        if ((base == nullptr) != (bytes == 0)) {
             std::abort();
         }
         if (base) {
+            const auto offset = base - static_cast<unsigned char*>(IOSurfaceGetBaseAddress(surface));
+            if (offset < 0 || static_cast<std::uint64_t>(offset) + bytes > IOSurfaceGetAllocSize(surface)) {
+                std::abort();
+            }
             std::memset(base, static_cast<int>(plane), bytes);
         }
     }
