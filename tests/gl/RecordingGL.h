@@ -40,8 +40,16 @@ class RecordingGL {
     /// What glBufferData was last given.
     std::vector<float> bufferData;
 
+    /// Called for every call before it is recorded, in the thread that calls. Threads must exclude each other.
+    std::function<void()> hook;
+
     // For the recorders.
-    void add(std::string call) { _calls.push_back(std::move(call)); }
+    void add(std::string call) {
+        if (hook) {
+            hook();
+        }
+        _calls.push_back(std::move(call));
+    }
     GLuint name() { return givesNames ? nextName++ : 0; }
 
   private:
