@@ -108,7 +108,7 @@ void treeOfManySources(benchmark::State& state) {
     for (auto _ : state) {
         SourceTree tree;
         for (const auto& source : sources) {
-            tree.addName(source.name);
+            tree.addName(*source.name);
         }
         benchmark::DoNotOptimize(tree);
     }
