@@ -1,5 +1,6 @@
 // Shows the same live source with several programs, one after another, and reads the clock in its picture back from the
 // screen. Nothing is taken from the programs' own words: a picture counts when its time code is seen on the screen.
+#include "bench/ProcessorTime.h"
 #include "tests/support/Process.h"
 #include "tests/support/Screen.h"
 #include "tools/publish/TimeCode.h"
@@ -9,10 +10,8 @@
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
-#include <fstream>
 #include <functional>
 #include <set>
-#include <sstream>
 #include <thread>
 #include <unistd.h>
 
@@ -52,27 +51,6 @@ struct Result {
 
 std::int64_t nowMs() {
     return duration_cast<milliseconds>(system_clock::now().time_since_epoch()).count();
-}
-
-/// Processor time of a process and its children so far, in seconds.
-double processorSeconds(pid_t pid) {
-    std::ifstream stat("/proc/" + std::to_string(pid) + "/stat");
-    std::string line;
-    std::getline(stat, line);
-    std::istringstream fields(line.substr(line.rfind(')') + 1));
-    std::string skipped;
-    for (int i = 0; i < 11; ++i) {
-        fields >> skipped;
-    }
-    double user = 0;
-    double system = 0;
-    fields >> user >> system;
-    double total = (user + system) / static_cast<double>(sysconf(_SC_CLK_TCK));
-    std::ifstream children("/proc/" + std::to_string(pid) + "/task/" + std::to_string(pid) + "/children");
-    for (pid_t child = 0; children >> child;) {
-        total += processorSeconds(child);
-    }
-    return total;
 }
 
 /// The largest window on the screen, or what it holds if that is the picture's own window.

@@ -1,4 +1,5 @@
 // Publishes, shows and records one live source at a time, and reads the clock in every picture of the movie.
+#include "bench/ProcessorTime.h"
 #include "tests/platform/TemporaryDirectory.h"
 #include "tests/record/MovieReader.h"
 #include "tests/support/Process.h"
@@ -11,9 +12,7 @@
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
-#include <fstream>
 #include <sched.h>
-#include <sstream>
 #include <thread>
 #include <unistd.h>
 
@@ -40,22 +39,6 @@ void useProcessors(int count) {
         }
     }
     sched_setaffinity(0, sizeof(some), &some);
-}
-
-/// Processor time of a process so far, in seconds.
-double processorSeconds(pid_t pid) {
-    std::ifstream stat("/proc/" + std::to_string(pid) + "/stat");
-    std::string line;
-    std::getline(stat, line);
-    std::istringstream fields(line.substr(line.rfind(')') + 1));
-    std::string skipped;
-    for (int i = 0; i < 11; ++i) {
-        fields >> skipped;
-    }
-    double user = 0;
-    double system = 0;
-    fields >> user >> system;
-    return (user + system) / static_cast<double>(sysconf(_SC_CLK_TCK));
 }
 
 /// Chooses the only source through the viewer's menu.
