@@ -12,6 +12,7 @@
 #include <atomic>
 #include <gtest/gtest.h>
 #include <mutex>
+#include <thread>
 
 namespace qivo::test {
 namespace {
