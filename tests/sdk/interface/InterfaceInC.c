@@ -1,5 +1,5 @@
 /* The interface is plain C. Nothing here runs: it compiles, or the interface has changed. */
-#include "tests/sdk/RecordLayout.h"
+#include "tests/sdk/interface/RecordLayout.h"
 
 int qivo_interface_is_plain_c(void);
 

@@ -1,2 +1,0 @@
-// The same layout as in C.
-#include "tests/sdk/RecordLayout.h"

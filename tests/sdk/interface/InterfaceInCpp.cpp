@@ -1,0 +1,2 @@
+// The same layout as in C.
+#include "tests/sdk/interface/RecordLayout.h"
