@@ -277,11 +277,12 @@ std::optional<ReceiverLoop::Outcome> ReceiverLoop::judgeSilence(const RtspSessio
     return outcome;
 }
 
-/// When time alone can change the judgement.
+/// When time alone can change the judgement, or earlier.
 ReceiverLoop::Clock::time_point ReceiverLoop::nextLook(const RtspSession& session, Clock::time_point began,
                                                        bool tcp) const {
     if (const auto lastPacket = session.lastPacket()) {
-        return *lastPacket + stallLimit(session);
+        // The limit may become shorter meanwhile.
+        return std::min<Clock::time_point>(*lastPacket + stallLimit(session), Clock::now() + kStallLimit);
     }
     if (const auto playing = session.playingSince()) {
         return *playing + firstPacketLimit(session, tcp);

@@ -22,8 +22,8 @@ inline constexpr std::chrono::milliseconds kUdpLimit{1000};
 inline constexpr std::chrono::milliseconds kTcpLimit{3000};
 /// How long a connected stream may bring nothing before it is made anew.
 inline constexpr std::chrono::milliseconds kStallLimit{1500};
-/// The same before its second picture, when it is not known how long it takes from one to the next.
-inline constexpr std::chrono::milliseconds kFirstStallLimit{3000};
+/// The same at its beginning, when it is not known how long it takes from one picture to the next.
+inline constexpr std::chrono::milliseconds kFirstStallLimit{6000};
 /// Intervals from picture to picture that a source with a slow rate may be silent, here and above.
 inline constexpr int kStallIntervals = 3;
 /// The longest time from the beginning of an attempt to the server's consent to send.

@@ -30,8 +30,12 @@ constexpr std::size_t kLargestSoundUnit = 1U << 20U;
 constexpr int kHandshakeRequests = 24;
 /// Those of them that set the stream up: over UDP and TCP, each with and without a login.
 constexpr int kHandshakeSetups = 4;
-/// What a source may say about the time from one picture to the next, in seconds.
+/// What is believed of a source about the time from one picture to the next, in seconds.
 constexpr double kLongestInterval = 30.0;
+/// How soon a gap is forgotten: with each picture this part of it. A hiccup of a fast source is over after a second.
+constexpr std::int64_t kFading = 16;
+/// How long a source has to be watched before it is known how long it takes, unless it says so.
+constexpr std::chrono::milliseconds kPaceTime{1000};
 /// Twice as many threads do not halve the time for one picture, but they wake up the other decoders' processors.
 constexpr guint kConversionThreads = 2;
 
@@ -136,6 +140,10 @@ GstOwned<GstSample> sampleOf(GstPad* pad, GstBuffer* buffer) {
 
 std::int64_t nowTicks() {
     return RtspSession::Clock::now().time_since_epoch().count();
+}
+
+std::int64_t ticksOf(double seconds) {
+    return std::chrono::duration_cast<RtspSession::Clock::duration>(std::chrono::duration<double>(seconds)).count();
 }
 
 std::optional<RtspSession::Clock::time_point> timeOf(std::int64_t ticks) {
@@ -372,18 +380,19 @@ void RtspSession::packetArrived() {
 void RtspSession::readRate(const GstStructure* rtp) {
     const double rate = g_ascii_strtod(textField(rtp, "a-framerate").c_str(), nullptr);
     if (rate > 0.0) {
-        const std::chrono::duration<double> interval(std::min(1.0 / rate, kLongestInterval));
-        m_saidInterval = std::chrono::duration_cast<Clock::duration>(interval).count();
+        m_saidInterval = ticksOf(std::min(1.0 / rate, kLongestInterval));
     }
 }
 
 void RtspSession::unitComplete() {
     m_unitBytes = 0;
-    m_lastUnit = nowTicks();
-    if (m_units == 0) {
-        m_firstUnit = m_lastUnit.load();
+    const std::int64_t now = nowTicks();
+    if (m_firstUnit == 0) {
+        m_firstUnit = now;
     }
-    ++m_units;
+    const std::int64_t last = m_lastUnit.exchange(now);
+    const std::int64_t gap = last == 0 ? 0 : std::min(now - last, ticksOf(kLongestInterval));
+    m_longestGap = std::max(gap, m_longestGap - m_longestGap / kFading);
 }
 
 void RtspSession::addBranch(GstPad* pad) {
@@ -483,9 +492,12 @@ std::optional<RtspSession::Clock::time_point> RtspSession::lastPacket() const {
 }
 
 RtspSession::Clock::duration RtspSession::unitInterval() const {
-    const std::int64_t units = m_units;
-    const std::int64_t seen = units > 1 ? (m_lastUnit - m_firstUnit) / (units - 1) : 0;
-    return Clock::duration(std::max<std::int64_t>(m_saidInterval, seen));
+    return Clock::duration(std::max<std::int64_t>(m_saidInterval, m_longestGap));
+}
+
+bool RtspSession::paceKnown() const {
+    const Clock::duration watched(m_lastUnit - m_firstUnit);
+    return watched >= (m_saidInterval > 0 ? Clock::duration(1) : kPaceTime);
 }
 
 } // namespace qivo::runtime

@@ -72,10 +72,11 @@ class RtspSession {
     /// When the last packet of a wanted stream arrived; empty before the first.
     std::optional<Clock::time_point> lastPacket() const;
     /// How long the source takes from one picture or unit of sound to the next: by what it says about its rate, or by
-    /// what came of it if that is longer. 0 if neither tells.
+    /// the longest that it took of late if that is longer. 0 if neither tells.
     Clock::duration unitInterval() const;
-    /// Whether enough has come to tell how long the source takes.
-    bool paceKnown() const { return m_units > 1; }
+    /// Whether enough has come to tell how long the source takes. A server may send all that it has ready at once,
+    /// which tells nothing.
+    bool paceKnown() const;
 
   private:
     struct Callbacks;
@@ -116,7 +117,7 @@ class RtspSession {
     std::atomic<std::int64_t> m_saidInterval = 0;
     std::atomic<std::int64_t> m_firstUnit = 0;
     std::atomic<std::int64_t> m_lastUnit = 0;
-    std::atomic<std::int64_t> m_units = 0; // complete ones so far
+    std::atomic<std::int64_t> m_longestGap = 0; // between complete ones; it fades
 
     mutable std::mutex m_mutex; // protects the rest
     std::optional<Failure> m_failure;

@@ -93,10 +93,23 @@ TEST_F(ReceiverHealing, TakesTcpAtOnceWhereUdpIsRefused) {
     EXPECT_EQ(server.tcpSetups(), 1);
 }
 
-TEST_F(ReceiverHealing, SourceThatStallsIsReconnected) {
-    RtspServer server({.launch = kPicture});
+/// Pictures that are each whole in themselves.
+std::string wholePictures(const std::string& rate, const std::string& beforePayloader) {
+    return "videotestsrc is-live=true do-timestamp=true ! video/x-raw,format=I420,width=320,height=240,framerate=" +
+           rate + " ! x264enc tune=zerolatency speed-preset=ultrafast key-int-max=1 bitrate=4000 ! " + beforePayloader +
+           "rtph264pay name=pay0 pt=96 config-interval=-1";
+}
+
+/// A rate of 0 means that none is told.
+const std::string kUntold = "capssetter caps=\"video/x-h264,framerate=(fraction)0/1\" ! ";
+
+class Stall : public ReceiverHealing, public testing::WithParamInterface<bool> {};
+
+TEST_P(Stall, SourceIsReconnected) {
+    const bool told = GetParam();
+    RtspServer server({.launch = told ? kPicture : wholePictures("30/1", kUntold)});
     const auto receiver = receive(server.url());
-    for (int i = 0; i < 5; ++i) {
+    for (int i = 0; i < (told ? 5 : 50); ++i) {
         ASSERT_TRUE(nextPicture(*receiver));
     }
     ASSERT_EQ(m_statusChanges, 1);
@@ -114,6 +127,9 @@ TEST_F(ReceiverHealing, SourceThatStallsIsReconnected) {
     EXPECT_LT(Clock::now() - returned, 2s);
     EXPECT_GE(m_statusChanges, 2);
 }
+
+INSTANTIATE_TEST_SUITE_P(WithRate, Stall, testing::Values(true, false),
+                         [](const auto& test) { return std::string(test.param ? "Told" : "Untold"); });
 
 TEST_F(ReceiverHealing, SourceThatIsReachedOverUdpAgainIsNoLongerTakenOverTcp) {
     const RtspServer server({.launch = kPicture});
@@ -171,15 +187,8 @@ TEST_F(ReceiverHealing, SourceThatBeginsLateIsShown) {
     beginning.join();
 }
 
-/// A picture every two seconds, each whole in itself.
-std::string rarePictures(const std::string& beforePayloader) {
-    return "videotestsrc is-live=true do-timestamp=true ! video/x-raw,format=I420,width=320,height=240,framerate=1/2 ! "
-           "x264enc tune=zerolatency speed-preset=ultrafast key-int-max=1 bitrate=4000 ! " +
-           beforePayloader + "rtph264pay name=pay0 pt=96 config-interval=-1";
-}
-
 TEST_F(ReceiverHealing, SourceThatSaysThatItIsSlowIsGivenItsTime) {
-    const RtspServer server({.launch = rarePictures("")});
+    const RtspServer server({.launch = wholePictures("1/2", "")});
     const auto receiver = receive(server.url());
     for (int i = 0; i < 3; ++i) {
         ASSERT_TRUE(nextPicture(*receiver, 8s)) << i;
@@ -189,8 +198,7 @@ TEST_F(ReceiverHealing, SourceThatSaysThatItIsSlowIsGivenItsTime) {
 }
 
 TEST_F(ReceiverHealing, SourceThatIsSlowWithoutSayingSoStaysConnected) {
-    // A rate of 0 means that none is told.
-    const RtspServer server({.launch = rarePictures("capssetter caps=\"video/x-h264,framerate=(fraction)0/1\" ! ")});
+    const RtspServer server({.launch = wholePictures("1/2", kUntold)});
     const auto receiver = receive(server.url());
     ASSERT_TRUE(nextPicture(*receiver, 10s));
     const int connections = server.connections();
