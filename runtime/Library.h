@@ -33,11 +33,13 @@ class Library {
     /// What a new receiver shares with the others.
     Receiver::Environment receiverEnvironment() const;
 
-    /// The handle of what was made just now; null where the last `destroy` has come first, which then would not see it.
-    template <typename Handle, typename Object, std::uint32_t Tag>
-    Handle admit(HandleRegistry<Handle, Object, Tag>& registry, std::shared_ptr<Object> object) {
+    /// The handle of what `make` makes; null where it makes nothing, and where the last `destroy` has come first, which
+    /// would not see it: then it is not called.
+    template <typename Handle, typename Object, std::uint32_t Tag, typename Make>
+    Handle admit(HandleRegistry<Handle, Object, Tag>& registry, const Make& make) {
         const std::lock_guard guard(m_admitting);
-        return isInitialized() ? registry.add(std::move(object)) : nullptr;
+        std::shared_ptr<Object> object = isInitialized() ? make() : nullptr;
+        return object ? registry.add(std::move(object)) : nullptr;
     }
 
     HandleRegistry<QIVOlib_recv_instance_t, Receiver, 0xF1520001> receivers;
@@ -47,7 +49,7 @@ class Library {
     Library() = default;
 
     std::mutex m_mutex;     // serialises initialize and destroy
-    std::mutex m_admitting; // held while something is admitted, and while the last destroy takes all out
+    std::mutex m_admitting; // held while something is made and admitted, and while the last destroy takes all out
     std::atomic<int> m_count = 0;
     const std::shared_ptr<TransportMemory> m_transports = std::make_shared<TransportMemory>();
 };

@@ -43,8 +43,8 @@ void QIVOlib_destroy(void) {
 }
 
 QIVOlib_find_instance_t QIVOlib_find_create_v2(const QIVOlib_find_create_t* p_settings) {
-    std::shared_ptr<Finder> finder = library().isInitialized() ? Finder::create(p_settings) : nullptr;
-    return finder ? library().admit(library().finders, std::move(finder)) : nullptr;
+    return library().admit(library().finders,
+                           [p_settings] { return std::shared_ptr<Finder>(Finder::create(p_settings)); });
 }
 
 void QIVOlib_find_destroy(QIVOlib_find_instance_t p_instance) {
@@ -69,11 +69,9 @@ const QIVOlib_source_t* QIVOlib_find_get_current_sources(QIVOlib_find_instance_t
 }
 
 QIVOlib_recv_instance_t QIVOlib_recv_create_v3(const QIVOlib_recv_create_v3_t* p_settings) {
-    if (!library().isInitialized()) {
-        return nullptr;
-    }
-    std::shared_ptr<Receiver> created = Receiver::create(p_settings, library().receiverEnvironment());
-    return created ? library().admit(library().receivers, std::move(created)) : nullptr;
+    return library().admit(library().receivers, [p_settings] {
+        return std::shared_ptr<Receiver>(Receiver::create(p_settings, library().receiverEnvironment()));
+    });
 }
 
 void QIVOlib_recv_destroy(QIVOlib_recv_instance_t p_instance) {
