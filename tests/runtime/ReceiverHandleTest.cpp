@@ -152,7 +152,8 @@ TEST(Library, NothingOutlivesALastEndThatItWasMadeBeside) {
         ASSERT_TRUE(QIVOlib_initialize());
         std::atomic<bool> going = false;
         std::thread making([&] {
-            for (bool made = true; made;) {
+            bool made = true;
+            for (int i = 0; made && i < 50; ++i) {
                 made = QIVOlib_recv_create_v3(&settings) != nullptr;
                 going = true;
             }
