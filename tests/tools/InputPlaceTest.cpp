@@ -47,7 +47,16 @@ TEST(InputPlace, deviceIsAskedForTheSizeAndRateThatWereWanted) {
               "image/jpeg, framerate=(fraction)60/1, width=(int)1280, height=(int)720");
     EXPECT_EQ(firstOf("video/x-raw,format=YUY2,width=320,height=240,framerate=5/1", wanted),
               "video/x-raw, format=(string)YUY2, width=(int)320, height=(int)240, framerate=(fraction)5/1");
-    EXPECT_EQ(firstOf("video/mpegts", wanted), "nothing");
+    EXPECT_EQ(firstOf("video/x-h264,width=640,height=480,framerate=15/1;"
+                      "video/x-raw,format=YUY2,width=320,height=240,framerate=5/1",
+                      wanted),
+              "video/x-raw, format=(string)YUY2, width=(int)320, height=(int)240, framerate=(fraction)5/1");
+    EXPECT_EQ(firstOf("video/x-h264,width=640,height=480,framerate=15/1", wanted),
+              "video/x-h264, width=(int)640, height=(int)480, framerate=(fraction)15/1");
+    EXPECT_EQ(firstOf("video/x-h265", wanted), "video/x-h265");
+    EXPECT_EQ(firstOf("video/mpegts,systemstream=true", wanted), "video/mpegts, systemstream=(boolean)true");
+    EXPECT_EQ(firstOf("video/x-dv,systemstream=true", wanted), "video/x-dv, systemstream=(boolean)true");
+    EXPECT_EQ(firstOf("audio/x-raw", wanted), "nothing");
 }
 
 TEST(InputPlace, missingDevicesAndThingsThatAreNoneAreNamed) {

@@ -157,7 +157,9 @@ std::string captureCaps(const PictureFormat& wanted) {
             caps += (caps.empty() ? "" : ";") + std::string(kind) + demand;
         }
     }
-    return caps;
+    // Some bring nothing but what is to be decoded; those have always one of these.
+    return caps + ";video/x-h264;video/x-h265;video/mpegts,systemstream=(boolean)true"
+                  ";video/x-dv,systemstream=(boolean)true";
 }
 
 std::vector<NeededElement> elementsFor(InputKind kind) {

@@ -40,7 +40,8 @@ struct InputPlace {
 [[nodiscard]] std::string inputProblem(InputPlace& place);
 
 /** What a capture device is asked for, in the order of preference: pictures of the wanted size and rate, raw or as
- *  JPEG, then faster ones, then those of another size, then whatever there is. As gst-launch takes it. */
+ *  JPEG, then faster ones, then those of another size, then any; without either H.264, H.265, an MPEG transport stream
+ *  or DV as it comes. As gst-launch takes it. */
 [[nodiscard]] std::string captureCaps(const PictureFormat& wanted);
 
 /** The elements that such an input needs, each with the Debian package that brings it. */
