@@ -99,9 +99,9 @@ class Neighbour {
         }
         m_process = Process::start({"/usr/bin/unshare", "--net", "/bin/sh", "-c", command}, {withoutLeakCheck});
         const std::string plug = "ip link add near type veth peer name far && ip address add 10.9.0.1/24 dev near && "
-                                 "ip link set near up && until ! ip link show far >/dev/null 2>&1; do "
-                                 "ip link set far netns " +
-                                 std::to_string(m_process->pid()) + "; sleep 0.02; done";
+                                 "ip link set near up && for try in $(seq 250); do "
+                                 "ip link show far >/dev/null 2>&1 || exit 0; ip link set far netns " +
+                                 std::to_string(m_process->pid()) + "; sleep 0.02; done; exit 1";
         EXPECT_EQ(std::system(plug.c_str()), 0);
         EXPECT_TRUE(m_process->waitForOutput("low bandwidth")) << m_process->errors();
     }
