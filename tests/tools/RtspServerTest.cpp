@@ -49,6 +49,8 @@ class RunningLoop {
 class CutOffViewer {
   public:
     explicit CutOffViewer(int port) {
+        const timeval limit{5, 0};
+        setsockopt(m_control, SOL_SOCKET, SO_RCVTIMEO, &limit, sizeof limit);
         sockaddr_in any = loopback(0);
         socklen_t length = sizeof any;
         bind(m_media, reinterpret_cast<const sockaddr*>(&any), length);
@@ -128,13 +130,13 @@ TEST(RtspServer, viewerWhoIsCutOffIsGivenUpAndOneWhoStaysIsNot) {
     ASSERT_EQ(server.listen(0, true), "");
     {
         const RunningLoop loop;
-        const CutOffViewer gone(server.port());
-        ASSERT_EQ(gone.played().find("RTSP/1.0 200"), 0U) << gone.played();
-        EXPECT_TRUE(becomes([&] { return server.viewers("/live") == 1; }, 2s)); // counted after it has been answered
-        EXPECT_GT(token.use_count(), idle) << "nothing is drawn for it";
         {
             Watcher stays("rtsp://127.0.0.1:" + std::to_string(server.port()) + "/live");
             ASSERT_TRUE(stays.next());
+            EXPECT_TRUE(becomes([&] { return server.viewers("/live") == 1; }, 2s)); // counted after it is answered
+            EXPECT_GT(token.use_count(), idle) << "nothing is drawn for it";
+            const CutOffViewer gone(server.port()); // last: its time runs
+            ASSERT_EQ(gone.played().find("RTSP/1.0 200"), 0U) << gone.played();
             EXPECT_TRUE(becomes([&] { return server.viewers("/live") == 2; }, 2s));
             EXPECT_TRUE(becomes([&] { return server.viewers("/live") == 1; }, 15s));
             for (int i = 0; i < 50; ++i) {
