@@ -19,9 +19,9 @@ struct Announcement {
     std::string onvif; ///< address of the device service; empty: none
 };
 
-/** Announces sources by multicast DNS as `_rtsp._tcp`, with a stack of its own that needs no daemon. It has a thread of
- *  its own, on which `say` is called with lines for the user. Where the network
- *  cannot be used it is tried again with growing pauses. Destruction says goodbye to the network. */
+/** Announces sources by multicast DNS as `_rtsp._tcp`, with a stack of its own that needs no daemon. `say` is called
+ * with lines for the user, on a thread of its own or, within `start`, on the caller's. Where the network cannot be used
+ * it is tried again with growing pauses. Destruction says goodbye to the network. */
 class Announcer {
   public:
     using Say = std::function<void(const std::string&)>;

@@ -24,7 +24,8 @@ gboolean quit(gpointer loop) {
     return G_SOURCE_CONTINUE;
 }
 
-// While inputs are examined, which takes seconds, nothing has begun that would have to be ended.
+// While GStreamer loads its plugins and inputs are examined, which takes seconds, nothing has begun that would have to
+// be ended.
 void endAtOnce(int) {
     _exit(0);
 }
