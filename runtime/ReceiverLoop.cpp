@@ -297,7 +297,9 @@ void ReceiverLoop::settle(const Outcome& outcome, const std::string& url, bool t
     if (outcome.slow && (tcp || !outcome.silent)) {
         m_patience = std::min(m_patience + 1, kMostPatience);
     }
-    if (tcp && outcome.described && outcome.connected == Clock::duration{}) {
+    // Another receiver may take a stream over TCP that this one has no use for.
+    if (tcp && outcome.described && outcome.connected == Clock::duration{} &&
+        outcome.failure.kind != RtspSession::Failure::Kind::noStream) {
         m_environment.transports->forget(sourceKey(url));
     }
     if (outcome.silent && !tcp) {

@@ -84,6 +84,25 @@ TEST_F(ReceiverHealing, RemembersThatASourceNeedsTcp) {
     EXPECT_EQ(m_udpSetups, 1) << "UDP was tried again by another receiver";
 }
 
+TEST_F(ReceiverHealing, ReceiverOfSoundThatIsNotThereLeavesTheOtherItsTcp) {
+    const RtspServer server({.launch = kPicture});
+    RawServer wall;
+    wall.forwardTo(server.port(), withoutUdp());
+    const auto receiver = receive(wall.url());
+    ASSERT_TRUE(nextPicture(*receiver));
+    const int connections = wall.connections();
+    const auto sound = receive(wall.url(), "", QIVOlib_recv_bandwidth_audio_only);
+    const auto deadline = Clock::now() + 15s;
+    while (wall.connections() < connections + 2 && Clock::now() < deadline) { // its second attempt
+        ASSERT_TRUE(nextPicture(*receiver));
+    }
+    ASSERT_GE(wall.connections(), connections + 2);
+    wall.closeAll();
+    ASSERT_TRUE(statusChanges(*receiver)) << "not connected again";
+    ASSERT_TRUE(nextPicture(*receiver));
+    EXPECT_EQ(m_udpSetups, 1) << "UDP was tried again";
+}
+
 TEST_F(ReceiverHealing, TakesTcpAtOnceWhereUdpIsRefused) {
     const RtspServer server({.launch = kPicture, .tcpOnly = true});
     const auto began = Clock::now();
