@@ -14,7 +14,8 @@ class Backoff {
     using Milliseconds = std::chrono::milliseconds;
 
     static constexpr Milliseconds kFirst{100};
-    /// Together with a handshake this keeps the picture's return within two seconds of the source's.
+    /// Together with a handshake this keeps the picture's return within two seconds of the source's, where the server
+    /// answers and sends at once.
     static constexpr Milliseconds kLongest{800};
     /// A connection that lasted this long counts as good; a shorter one does not reset the pause, or a source that
     /// accepts and closes would be tried without end at the shortest one.

@@ -80,6 +80,9 @@ void ReceiverLoop::run() {
             continue;
         }
         const bool tcp = std::exchange(m_nextTcp, false) || m_environment.transports->needsTcp(sourceKey(url));
+        if (std::exchange(m_attempted, url) != url) {
+            m_patience = 0;
+        }
         m_first = false;
         m_hurry = false;
         m_backoff.attemptBegan(Clock::now());
@@ -183,13 +186,14 @@ ReceiverLoop::Outcome ReceiverLoop::watch(const RtspSession& session, const std:
     while (!m_stopped) {
         const std::uint64_t seen = m_wakeup->count();
         refreshAnnouncement();
-        if (!connected && session.lastPacket()) {
+        if (const auto lastPacket = session.lastPacket(); !connected && lastPacket) {
             connected = true;
             m_reported.clear();
             if (tcp) {
                 m_environment.transports->remember(sourceKey(url));
             }
-            if (session.playingSince().value_or(Clock::now()) - began < kStepLimit) {
+            const Clock::time_point playing = session.playingSince().value_or(*lastPacket);
+            if (playing - began < kStepLimit && *lastPacket - playing < kTcpLimit) {
                 m_patience = 0;
             }
             m_mailbox->raiseStatus();

@@ -105,7 +105,8 @@ class ReceiverLoop {
     bool m_first = true;    ///< no attempt has been made
     bool m_nextTcp = false; ///< the last attempt got consent over UDP and nothing more
     bool m_shown = false;   ///< the source has been connected
-    int m_patience = 0;     ///< how often the limits have been doubled
+    int m_patience = 0;     ///< how often the limits have been doubled for the address that was last attempted
+    std::string m_attempted;
     bool m_hurry = false;   ///< the source has been announced, or announced differently, since the last attempt
     std::string m_reported; ///< the failure that was last logged
 

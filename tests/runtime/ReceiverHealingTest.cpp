@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <atomic>
+#include <mutex>
 #include <regex>
 #include <thread>
 
@@ -182,28 +183,71 @@ TEST_F(ReceiverHealing, ServerThatThinksForTwoSecondsIsShown) {
     EXPECT_TRUE(nextPicture(*receiver, 2s));
 }
 
+/// A server in between whose source begins some time after it was asked to play.
+class LateSource {
+  public:
+    LateSource(RtspServer& server, std::chrono::milliseconds delay) : m_server(server), m_delay(delay) {
+        m_way.forwardTo(server.port(), [this](std::string bytes) {
+            const std::lock_guard guard(m_mutex);
+            if (bytes.rfind("DESCRIBE", 0) == 0) {
+                m_server.setSilent(false); // it answers once it has a picture
+            } else if (bytes.rfind("PLAY", 0) == 0) {
+                m_played = Clock::now();
+                m_server.setSilent(true);
+                ++m_plays;
+            }
+            return bytes;
+        });
+        m_beginning = std::thread([this] {
+            while (!m_ended) {
+                {
+                    const std::lock_guard guard(m_mutex);
+                    if (Clock::now() - m_played >= m_delay) {
+                        m_server.setSilent(false);
+                    }
+                }
+                std::this_thread::sleep_for(5ms);
+            }
+        });
+    }
+    ~LateSource() {
+        m_ended = true;
+        m_beginning.join();
+    }
+    LateSource(const LateSource&) = delete;
+    LateSource& operator=(const LateSource&) = delete;
+
+    RawServer& way() { return m_way; }
+    int plays() const { return m_plays; }
+
+  private:
+    RtspServer& m_server;
+    const std::chrono::milliseconds m_delay;
+    std::mutex m_mutex;
+    Clock::time_point m_played = Clock::now(); // under m_mutex
+    std::atomic<int> m_plays = 0;
+    std::atomic<bool> m_ended = false;
+    std::thread m_beginning;
+    RawServer m_way;
+};
+
 TEST_F(ReceiverHealing, SourceThatBeginsLateIsShown) {
     RtspServer server({.launch = kPicture});
-    std::atomic<Clock::rep> played = Clock::now().time_since_epoch().count();
-    std::atomic<bool> ended = false;
-    RawServer slow;
-    slow.forwardTo(server.port(), [&](std::string bytes) {
-        if (bytes.rfind("PLAY", 0) == 0) {
-            server.setSilent(true);
-            played = Clock::now().time_since_epoch().count();
-        }
-        return bytes;
-    });
-    std::thread beginning([&] {
-        while (!ended) {
-            server.setSilent(Clock::now() - Clock::time_point(Clock::duration(played)) < 1500ms);
-            std::this_thread::sleep_for(5ms);
-        }
-    });
-    const auto receiver = receive(slow.url());
+    LateSource late(server, 1500ms);
+    const auto receiver = receive(late.way().url());
     EXPECT_TRUE(nextPicture(*receiver, 10s));
-    ended = true;
-    beginning.join();
+}
+
+TEST_F(ReceiverHealing, SourceThatBeginsVeryLateIsStillWaitedForNextTime) {
+    RtspServer server({.launch = kPicture});
+    LateSource late(server, 4s);
+    const auto receiver = receive(late.way().url());
+    ASSERT_TRUE(pictureThat(
+        *receiver, [&](const Shot&) { return m_statusChanges == 1; }, 20s));
+    const int plays = late.plays();
+    late.way().closeAll();
+    ASSERT_TRUE(statusChanges(*receiver, 20s)) << "not connected again";
+    EXPECT_EQ(late.plays(), plays + 1) << "the time that it needs was forgotten";
 }
 
 TEST_F(ReceiverHealing, SourceThatSaysThatItIsSlowIsGivenItsTime) {
