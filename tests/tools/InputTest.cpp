@@ -5,9 +5,14 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <poll.h>
+#include <sys/inotify.h>
+#include <unistd.h>
+
 #include <csignal>
 #include <cstdlib>
 #include <filesystem>
+#include <functional>
 
 namespace qivo::test {
 namespace {
@@ -127,6 +132,17 @@ TEST(Input, relayShowsThatItsOriginIsAwayAndComesBackByItself) {
     EXPECT_TRUE(waitForBlue(true));
 }
 
+/// Whether the file is opened within `limit` of `start`, which is called first.
+bool isOpened(const std::string& path, const std::function<void()>& start, std::chrono::milliseconds limit) {
+    const int watch = inotify_init1(IN_CLOEXEC);
+    EXPECT_GE(inotify_add_watch(watch, path.c_str(), IN_OPEN), 0);
+    start();
+    pollfd opened{watch, POLLIN, 0};
+    const bool seen = poll(&opened, 1, static_cast<int>(limit.count())) == 1;
+    close(watch);
+    return seen;
+}
+
 TEST(Input, interruptIsHeardWhileInputsAreExamined) {
     const MediaFile film(redThenGreen("mp4mux name=m"), ".mp4");
     std::vector<std::string> command{PUBLISH, "--loopback-only", "--port", "0"};
@@ -134,11 +150,13 @@ TEST(Input, interruptIsHeardWhileInputsAreExamined) {
         command.insert(command.end(), {"--source", std::to_string(i), "--input", film.path()});
     }
     for (const int signal : {SIGINT, SIGTERM}) {
-        const auto process = Process::start(command, {withoutLeakCheck});
-        EXPECT_FALSE(process->wait(500ms)) << process->errors();
-        EXPECT_EQ(process->output(), "") << "it serves already";
+        std::unique_ptr<Process> process;
+        ASSERT_TRUE(isOpened(
+            film.path(), [&] { process = Process::start(command, {withoutLeakCheck}); }, 20s))
+            << process->errors();
         process->signal(signal);
-        EXPECT_EQ(process->wait(500ms), 0);
+        EXPECT_EQ(process->wait(5s), 0);
+        EXPECT_EQ(process->output(), "") << "it served already";
     }
 }
 
