@@ -114,7 +114,10 @@ EncoderChoice chooseEncoder(const std::vector<EncoderCandidate>& candidates, con
         if (!isInstalled(candidate.element)) {
             continue;
         }
-        const std::string failure = candidate.hardware ? trial(candidate, shape, limit, stopped) : "";
+        const bool late = candidate.hardware && (stopped || std::chrono::steady_clock::now() >= limit);
+        const std::string failure = late                 ? "takes too long"
+                                    : candidate.hardware ? trial(candidate, shape, limit, stopped)
+                                                         : "";
         if (failure.empty()) {
             choice.encoder = candidate;
             return choice;
