@@ -8,6 +8,8 @@ namespace qivo::record {
 namespace {
 
 constexpr Nanoseconds encoderLimit = std::chrono::milliseconds(500);
+constexpr Nanoseconds trialStep = std::chrono::milliseconds(10);
+constexpr Nanoseconds trialEndLimit = std::chrono::milliseconds(500); ///< to be over after its limit, or when stopped
 constexpr Nanoseconds quiet = std::chrono::seconds(1);
 // Pictures that hardware is tried with before there is one. What is smaller or larger than it is sure to take is tried
 // again.
@@ -21,11 +23,15 @@ bool isUsual(const PictureShape& shape) {
 
 } // namespace
 
-Recorder::Recorder(Settings settings, MoviePlace place) : m_settings(std::move(settings)), m_writer(std::move(place)) {
-    m_choice = std::async(std::launch::async, [this] {
-        return chooseEncoder(m_settings.encoders(usualShape, std::thread::hardware_concurrency()), usualShape,
-                             m_stopping);
-    });
+/// What the threads that try encoders use, which a driver may keep beyond the recorder's life.
+struct Recorder::Trials {
+    std::atomic<bool> stopped = false;
+    std::atomic<int> running = 0;
+};
+
+Recorder::Recorder(Settings settings, MoviePlace place)
+    : m_settings(std::move(settings)), m_writer(std::move(place)), m_trials(std::make_shared<Trials>()),
+      m_choice(beginTrial(usualShape)) {
     Reception::Calls calls;
     calls.picture = [this](const auto& frame, Nanoseconds at) { takePicture(frame, at); };
     calls.sound = [this](const auto& frame, Nanoseconds at) { takeSound(frame, at); };
@@ -41,21 +47,46 @@ Recorder::~Recorder() {
     finish();
 }
 
+/// On a thread that nobody waits for: nothing can be done about a driver that does not come back.
+std::future<EncoderChoice> Recorder::beginTrial(const PictureShape& shape) {
+    auto candidates = m_settings.encoders(shape, std::thread::hardware_concurrency());
+    std::packaged_task<EncoderChoice()> task([trials = m_trials, candidates = std::move(candidates), shape] {
+        EncoderChoice choice = chooseEncoder(candidates, shape, trials->stopped);
+        --trials->running;
+        return choice;
+    });
+    std::future<EncoderChoice> choice = task.get_future();
+    ++m_trials->running;
+    std::thread(std::move(task)).detach();
+    return choice;
+}
+
+EncoderChoice Recorder::endTrial(std::future<EncoderChoice> trial) const {
+    Nanoseconds limit = steadyNow() + trialLimit + trialEndLimit;
+    while (trial.wait_for(trialStep) != std::future_status::ready) {
+        if (m_trials->stopped) {
+            limit = std::min(limit, steadyNow() + trialEndLimit);
+        }
+        if (steadyNow() >= limit) {
+            return {std::nullopt, "hardware (its driver hangs)"};
+        }
+    }
+    return trial.get();
+}
+
 /// Software is given other properties for other shapes.
 EncoderChoice Recorder::encoderFor(const PictureShape& shape) {
-    EncoderChoice early = m_choice.get();
-    const bool hardware = early.encoder && early.encoder->hardware;
-    if (hardware && isUsual(shape)) {
-        return early;
+    EncoderChoice choice = endTrial(std::move(m_choice));
+    if (choice.encoder && choice.encoder->hardware && !isUsual(shape)) {
+        choice = endTrial(beginTrial(shape));
     }
-    auto candidates = m_settings.encoders(shape, std::thread::hardware_concurrency());
-    if (!hardware) {
-        std::erase_if(candidates, [](const EncoderCandidate& candidate) { return candidate.hardware; });
-        EncoderChoice choice = chooseEncoder(candidates, shape, m_stopping);
-        choice.passedOver = early.passedOver;
+    if (choice.encoder && choice.encoder->hardware) {
         return choice;
     }
-    return chooseEncoder(candidates, shape, m_stopping);
+    auto candidates = m_settings.encoders(shape, std::thread::hardware_concurrency());
+    std::erase_if(candidates, [](const EncoderCandidate& candidate) { return candidate.hardware; });
+    choice.encoder = chooseEncoder(candidates, shape, m_trials->stopped).encoder;
+    return choice;
 }
 
 bool Recorder::startEncoder(const QIVOlib_video_frame_v2_t& frame) {
@@ -64,10 +95,12 @@ bool Recorder::startEncoder(const QIVOlib_video_frame_v2_t& frame) {
     calls.picture = [this](CodedPicture picture) { m_writer.add(std::move(picture)); };
     const PictureShape shape = shapeFor(frame);
     const EncoderChoice choice = encoderFor(shape);
-    std::string problem = "there is no H.264 encoder for GStreamer (Debian: gstreamer1.0-plugins-ugly)";
+    std::string problem;
+    if (!choice.encoder && !m_trials->stopped) {
+        problem = "there is no H.264 encoder for GStreamer (Debian: gstreamer1.0-plugins-ugly)";
+    }
     std::unique_ptr<PictureEncoder> encoder;
     if (choice.encoder) {
-        problem.clear();
         encoder = PictureEncoder::create(shape, *choice.encoder, std::move(calls), problem);
     }
     const std::lock_guard guard(m_mutex);
@@ -81,7 +114,8 @@ bool Recorder::startEncoder(const QIVOlib_video_frame_v2_t& frame) {
 }
 
 void Recorder::takePicture(const QIVOlib_video_frame_v2_t& frame, Nanoseconds place) {
-    if (!m_encoder && (frame.xres <= 0 || frame.yres <= 0 || !problem().empty() || !startEncoder(frame))) {
+    if (!m_encoder &&
+        (m_trials->stopped || frame.xres <= 0 || frame.yres <= 0 || !problem().empty() || !startEncoder(frame))) {
         return;
     }
     const PictureEncoder::Taken taken = m_encoder->encode(frame, place);
@@ -162,13 +196,20 @@ std::string Recorder::remark() const {
 }
 
 void Recorder::finish() {
-    m_stopping = true;
+    m_trials->stopped = true;
     m_pictures->stop();
     m_sounds->stop();
     if (m_encoder) {
         m_dropped += m_encoder->finish(encoderLimit);
     }
     m_writer.finish();
+    if (m_choice.valid()) { // no picture has come that would have waited for it
+        m_choice.wait_for(trialEndLimit);
+    }
+}
+
+bool Recorder::isTrying() const {
+    return m_trials->running > 0;
 }
 
 } // namespace qivo::record

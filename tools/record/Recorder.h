@@ -55,13 +55,20 @@ class Recorder {
     /** Ends receiving and finishes the movie; normally within a fraction of a second, and without a limit where the
      * disk hangs. Thread: any, while `progress` may be asked for. */
     void finish();
+    /** Whether an encoder is being tried. Where that is so after `finish` a driver does not come back: the program must
+     *  end without taking down what it may use. Thread: any. */
+    [[nodiscard]] bool isTrying() const;
 
   private:
+    struct Trials;
+
     static constexpr std::int64_t never = std::numeric_limits<std::int64_t>::min() / 2;
 
     void takePicture(const QIVOlib_video_frame_v2_t& frame, Nanoseconds place);
     void takeSound(const QIVOlib_audio_frame_v2_t& frame, Nanoseconds place);
     [[nodiscard]] bool startEncoder(const QIVOlib_video_frame_v2_t& frame);
+    [[nodiscard]] std::future<EncoderChoice> beginTrial(const PictureShape& shape);
+    [[nodiscard]] EncoderChoice endTrial(std::future<EncoderChoice> trial) const;
     [[nodiscard]] EncoderChoice encoderFor(const PictureShape& shape);
     [[nodiscard]] Nanoseconds lastFrame() const;
     [[nodiscard]] std::string waiting(Nanoseconds now, const MovieWriter::Status& written) const;
@@ -69,7 +76,7 @@ class Recorder {
     const Settings m_settings;
     MovieWriter m_writer;
     SoundFitter m_sound; // sound's thread only
-    std::atomic<bool> m_stopping = false;
+    const std::shared_ptr<Trials> m_trials;
     std::future<EncoderChoice> m_choice; // begun before the first picture, since trying hardware takes its time
     mutable std::mutex m_mutex;
     std::unique_ptr<PictureEncoder> m_encoder; // made by the pictures' thread under m_mutex

@@ -6,6 +6,7 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <functional>
 #include <future>
 
 namespace {
@@ -29,15 +30,11 @@ void doWhileTelling(Work work, Tell tell) {
 }
 
 /// Until somebody wants it to end, or it cannot go on.
-void watch(Surroundings& surroundings, const Recorder& recorder) {
-    bool encoderTold = false;
+template <typename TellEncoder>
+void watch(Surroundings& surroundings, const Recorder& recorder, TellEncoder tellEncoder) {
     do {
         surroundings.tell(progressLine(recorder.progress(steadyNow())));
-        const std::string encoder = encoderTold ? "" : recorder.encoder();
-        if (!encoder.empty()) {
-            std::fprintf(stderr, "%s: %s\n", programName, encoder.c_str());
-            encoderTold = true;
-        }
+        tellEncoder();
     } while (!surroundings.endWanted(progressInterval) && recorder.state(steadyNow()) == Recorder::State::running);
 }
 
@@ -45,9 +42,15 @@ int fail(const Arguments& arguments) {
     return fail("nothing came from \"" + arguments.source + "\": there is no movie");
 }
 
-int record(const Arguments& arguments, const MoviePlace& place, Surroundings& surroundings) {
-    Recorder recorder({arguments.source}, place);
-    watch(surroundings, recorder);
+int watchAndFinish(const Arguments& arguments, Recorder& recorder, Surroundings& surroundings) {
+    auto tellEncoder = [&recorder, told = false]() mutable {
+        const std::string encoder = told ? "" : recorder.encoder();
+        if (!encoder.empty()) {
+            std::fprintf(stderr, "%s: %s\n", programName, encoder.c_str());
+            told = true;
+        }
+    };
+    watch(surroundings, recorder, std::ref(tellEncoder));
     const bool gone = recorder.state(steadyNow()) == Recorder::State::sourceGone;
     const auto tell = [&] { surroundings.tell(progressLine(recorder.progress(steadyNow()))); };
     doWhileTelling([&] { recorder.finish(); }, tell);
@@ -65,6 +68,15 @@ int record(const Arguments& arguments, const MoviePlace& place, Surroundings& su
         std::fprintf(stderr, "%s: %s\n", programName, recorder.remark().c_str());
     }
     return 0;
+}
+
+int record(const Arguments& arguments, const MoviePlace& place, Surroundings& surroundings) {
+    Recorder recorder({arguments.source}, place);
+    const int code = watchAndFinish(arguments, recorder, surroundings);
+    if (recorder.isTrying()) {
+        std::_Exit(code); // what has been said is out, as nothing here is buffered
+    }
+    return code;
 }
 
 /// Prepares all that recording needs, once the place for the movie is found good.
