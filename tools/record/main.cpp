@@ -55,6 +55,7 @@ int watchAndFinish(const Arguments& arguments, Recorder& recorder, Surroundings&
     const auto tell = [&] { surroundings.tell(progressLine(recorder.progress(steadyNow()))); };
     doWhileTelling([&] { recorder.finish(); }, tell);
     tell();
+    tellEncoder(); // it may have been chosen only now
     if (!recorder.problem().empty()) {
         return fail(recorder.problem());
     }
