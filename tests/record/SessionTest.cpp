@@ -12,6 +12,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
+#include <thread>
 #include <unistd.h>
 
 namespace qivo::record {
@@ -73,9 +74,12 @@ TEST_F(SessionTest, ASourceThatHasNotComeIsWaitedForWithoutEnd) {
 
 TEST_F(SessionTest, AFolderThatGoesBeforeTheFirstPictureIsAFailure) {
     m_path = m_folder.path("gone/A.mov");
-    start("picture=160x90@30");
+    start("picture=160x90@30 sound=8000x1");
     EXPECT_TRUE(test::eventually([&] { return m_recorder->state(steadyNow()) == Recorder::State::failed; }));
     EXPECT_EQ(m_recorder->problem(), "cannot record to \"" + m_path + "\": No such file or directory");
+    std::this_thread::sleep_for(milliseconds(100)); // in which sound goes on coming
+    EXPECT_EQ(m_recorder->progress(steadyNow()).soundLost, Nanoseconds(0)) << "the disk is not slow";
+    EXPECT_NE(m_recorder->progress(steadyNow()).waiting, "the disk");
 }
 
 TEST_F(SessionTest, AnEncoderThatFailsEndsTheRecordingAndTheMoviePlaysUpToThere) {

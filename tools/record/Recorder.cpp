@@ -127,8 +127,9 @@ void Recorder::takePicture(const QIVOlib_video_frame_v2_t& frame, Nanoseconds pl
 
 void Recorder::takeSound(const QIVOlib_audio_frame_v2_t& frame, Nanoseconds place) {
     std::vector<std::uint8_t> bytes = m_sound.fit(frame);
-    // What the disk is too slow for becomes silence.
-    if (!bytes.empty() && !m_writer.add(SoundPiece{std::move(bytes), place}, m_sound.format())) {
+    // What the disk is too slow for becomes silence. A writer that has failed takes nothing either.
+    if (!bytes.empty() && !m_writer.add(SoundPiece{std::move(bytes), place}, m_sound.format()) &&
+        m_writer.status().problem.empty()) {
         m_lastSoundLost = steadyNow().count();
         m_soundLost += std::int64_t{frame.no_samples} * std::nano::den / frame.sample_rate;
     }
