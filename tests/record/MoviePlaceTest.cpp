@@ -8,6 +8,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <iterator>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <utime.h>
 
@@ -130,6 +131,20 @@ TEST_F(MoviePlaceTest, AnExistingMovieIsKeptUnderItsTime) {
     record(place("STUDIO (Cam 1)"), "second");
     EXPECT_EQ(contentOf(m_folder.path("STUDIO (Cam 1) 2023-11-14 22.13.20.mov")), "first");
     EXPECT_EQ(contentOf(movie), "second");
+}
+
+TEST_F(MoviePlaceTest, WhereNoFileCanBeMadeTheExistingMovieHasItsNameAgain) {
+    const std::string movie = m_folder.write("A.mov", "first");
+    rlimit files{};
+    ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &files), 0);
+    const rlimit none{0, files.rlim_max};
+    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &none), 0);
+    std::string problem;
+    EXPECT_FALSE(place("A").create(problem));
+    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &files), 0);
+    EXPECT_EQ(problem, "cannot record to \"" + movie + "\": Too many open files");
+    EXPECT_EQ(namesIn(m_folder.path()), std::vector<std::string>{"A.mov"});
+    EXPECT_EQ(contentOf(movie), "first");
 }
 
 TEST_F(MoviePlaceTest, ManyOfTheSameSecondAreAllKept) {

@@ -148,8 +148,14 @@ void MoviePlace::takeBack() {
         return;
     }
     unlink(m_path.c_str());
+    giveBack();
+}
+
+/// What had the movie's name before has it again.
+void MoviePlace::giveBack() {
     if (!m_kept.empty()) {
         renameWithoutReplacing(m_kept, m_path);
+        m_kept.clear();
     }
     foldersToDisk();
 }
@@ -191,6 +197,7 @@ FileHandle MoviePlace::create(std::string& problem) {
         }
         error = errno;
     }
+    giveBack();
     problem = reason("record to \"" + m_path + "\"", error);
     return FileHandle();
 }

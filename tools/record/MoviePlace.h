@@ -33,6 +33,7 @@ class MoviePlace {
     [[nodiscard]] std::string reason(const std::string& what, int error) const;
     [[nodiscard]] bool makeFolders(std::string& problem) const;
     void foldersToDisk() const;
+    void giveBack();
     [[nodiscard]] bool keepExisting(std::string& problem);
 
     std::string m_path;
