@@ -61,6 +61,15 @@ TEST_F(MovieFileTest, IsPlayableAfterEveryFragment) {
     }
 }
 
+TEST_F(MovieFileTest, GoesOnWhereTheFileSystemNeverTellsANumberOfNames) {
+    FileHandle file = openFile(m_path);
+    std::filesystem::remove(m_path); // tells 0 names from the beginning, as theirs do
+    MovieFile movie(std::move(file));
+    movie.setSound(kSound);
+    EXPECT_TRUE(movie.append(soundFragment(0))) << movie.error();
+    EXPECT_TRUE(movie.finish()) << movie.error();
+}
+
 TEST_F(MovieFileTest, AFinishedMovieHasOneDataAtomAndAnIndexBehindIt) {
     MovieFile movie(openFile(m_path));
     movie.setSound(kSound);

@@ -30,6 +30,7 @@ int FileHandle::release() {
 }
 
 MovieFile::MovieFile(FileHandle file) : m_file(std::move(file)) {
+    m_hasName = links() > 0;
     m_info.created = static_cast<std::uint64_t>(std::time(nullptr)) + secondsFrom1904To1970;
 }
 
@@ -59,10 +60,15 @@ bool MovieFile::toDisk() {
     return false;
 }
 
-/// What nobody can find any more would be written until the disk is full.
-bool MovieFile::stillThere() {
+/// How many names the file has.
+std::uint64_t MovieFile::links() const {
     struct stat about {};
-    m_deleted = fstat(m_file.get(), &about) == 0 && about.st_nlink == 0;
+    return fstat(m_file.get(), &about) == 0 ? about.st_nlink : 1;
+}
+
+/// What nobody can find any more would be written until the disk is full. Some file systems say so of every file.
+bool MovieFile::stillThere() {
+    m_deleted = m_hasName && links() == 0;
     return !m_deleted;
 }
 

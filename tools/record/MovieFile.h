@@ -63,6 +63,7 @@ class MovieFile {
     [[nodiscard]] bool writeHead();
     [[nodiscard]] bool writeFragment(const Fragment& fragment);
     [[nodiscard]] bool toDisk();
+    [[nodiscard]] std::uint64_t links() const;
     [[nodiscard]] bool stillThere();
     void cutToWhole();
 
@@ -71,7 +72,8 @@ class MovieFile {
     SampleTables m_tables;
     std::uint64_t m_end = 0; ///< of what is complete
     std::uint32_t m_sequence = 0;
-    int m_error = 0; ///< the system's number
+    int m_error = 0;        ///< the system's number
+    bool m_hasName = false; ///< had one, as far as the file system tells
     bool m_deleted = false;
 };
 
