@@ -14,6 +14,7 @@ struct FallbackAudioDriver::Drivers {
     const std::shared_ptr<AudioOutputDriver> preferred;
     const std::shared_ptr<AudioOutputDriver> fallback;
     std::atomic<bool> preferredIsThere = false; // has been once
+    std::atomic<bool> fallbackPlayed = false;
 };
 
 namespace {
@@ -54,9 +55,11 @@ class FallbackAudioOutput : public AudioOutput {
 
   private:
     void judge(State preferred) {
-        if (preferred == State::Running || preferred == State::Failed) {
+        // One that came without a device while the fallback played is none to wait for.
+        const bool failed = preferred == State::Failed;
+        if (preferred == State::Running || (failed && !m_drivers->fallbackPlayed)) {
             m_drivers->preferredIsThere = true;
-        } else if (preferred == State::Absent && !m_drivers->preferredIsThere) {
+        } else if ((preferred == State::Absent || failed) && !m_drivers->preferredIsThere) {
             m_onFallback = true;
             m_why = m_output->description();
             m_lookAt = m_drivers->preferred->now() + FallbackAudioDriver::kLookInterval;
@@ -65,6 +68,9 @@ class FallbackAudioOutput : public AudioOutput {
     }
 
     void look() {
+        if (!m_failed && m_output->state() == State::Running) {
+            m_drivers->fallbackPlayed = true;
+        }
         if (!m_looking && m_drivers->preferred->now() < m_lookAt) {
             return;
         }

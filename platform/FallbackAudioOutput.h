@@ -10,7 +10,8 @@ namespace qivo {
 ///
 /// Once the first has found something in this process, the second is never tried again: a sound server that restarts
 /// must not find its hardware taken. While the second plays, the first is looked for now and then; when it has a device
-/// to play to the output fails, and the next one is the first's.
+/// to play to the output fails, and the next one is the first's. Until then a first that fails leaves the second in its
+/// place, also when the output is opened anew.
 class FallbackAudioDriver : public AudioOutputDriver {
   public:
     static constexpr std::chrono::seconds kLookInterval{10};

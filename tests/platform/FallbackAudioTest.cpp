@@ -156,9 +156,14 @@ TEST_F(FallbackAudioTest, APreferredDriverWithoutADeviceLeavesTheOtherItsSound) 
     ASSERT_EQ(advance(3 * FallbackAudioDriver::kLookInterval - 1s), State::Running);
     EXPECT_EQ(preferred->attempts(), 3) << "and is looked for as before";
     EXPECT_EQ(fallback->attempts(), 1);
-    preferred->setOptions(absent());
     open();
     EXPECT_EQ(advance(100ms), State::Running) << "what never played is not waited for";
+    EXPECT_EQ(fallback->attempts(), 2);
+    preferred->setOptions(NullAudioDriver::Options());
+    EXPECT_EQ(advance(FallbackAudioDriver::kLookInterval), State::Failed);
+    preferred->setOptions(failing());
+    open();
+    EXPECT_EQ(advance(100ms), State::Failed) << "what has played is";
     EXPECT_EQ(fallback->attempts(), 2);
 }
 
