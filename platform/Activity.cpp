@@ -123,9 +123,10 @@ class Activity::Conversation {
         serveUntil([this] { return m_ending; }, Clock::time_point::max());
         // What has been asked is answered first, so that it can be let go.
         const Clock::time_point deadline = Clock::now() + milliseconds(kEndTimeoutMs);
-        serveUntil([this] { return m_unanswered == 0; }, deadline);
+        const auto answered = [this] { return m_unanswered == 0 || (!m_session && !m_system); };
+        serveUntil(answered, deadline);
         release();
-        serveUntil([this] { return m_unanswered == 0; }, deadline);
+        serveUntil(answered, deadline);
         m_session.reset();
         m_system.reset();
     }

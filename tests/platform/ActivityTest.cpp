@@ -211,6 +211,29 @@ TEST(Activity, IsSilentWhereThereIsNoBus) {
     EXPECT_THAT(testing::internal::GetCapturedStderr(), IsEmpty());
 }
 
+TEST(Activity, EndsAtOnceWhereBothBusesHangUp) {
+    const std::string path = testing::TempDir() + "qivo-rude-bus-" + std::to_string(getpid());
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    path.copy(address.sun_path, sizeof(address.sun_path) - 1);
+    const int listener = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    ASSERT_EQ(bind(listener, reinterpret_cast<const sockaddr*>(&address), sizeof(address)), 0);
+    ASSERT_EQ(listen(listener, 2), 0);
+    qputenv("DBUS_SESSION_BUS_ADDRESS", ("unix:path=" + path).c_str());
+    qputenv("DBUS_SYSTEM_BUS_ADDRESS", ("unix:path=" + path).c_str());
+    std::chrono::steady_clock::time_point ended;
+    {
+        const Activity activity("realtime UDP receiving");
+        close(accept(listener, nullptr, nullptr));
+        close(accept(listener, nullptr, nullptr));
+        std::this_thread::sleep_for(std::chrono::milliseconds(100));
+        ended = std::chrono::steady_clock::now();
+    }
+    EXPECT_LT(std::chrono::steady_clock::now() - ended, std::chrono::milliseconds(Activity::kEndTimeoutMs / 2));
+    close(listener);
+    unlink(path.c_str());
+}
+
 /// Two buses that take connections and never say a word.
 class SilentBusTest : public testing::Test {
   protected:
