@@ -12,8 +12,10 @@
 #include <gtest/gtest.h>
 
 #include <atomic>
+#include <cerrno>
 #include <condition_variable>
 #include <cstdlib>
+#include <ctime>
 #include <linux/futex.h>
 #include <malloc.h>
 #include <memory>
@@ -172,8 +174,22 @@ TEST_F(AllocationTest, TheCounterCountsEveryWayToWait) {
     sem_init(&semaphore, 0, 1);
     sem_wait(&semaphore);
     EXPECT_EQ(counted(), 1U);
+    const timespec past{};
+    EXPECT_NE(sem_timedwait(&semaphore, &past), 0);
+    EXPECT_NE(sem_clockwait(&semaphore, CLOCK_MONOTONIC, &past), 0);
+    EXPECT_EQ(counted(), 2U);
     sem_destroy(&semaphore);
+    lock.lock();
+    counted();
+    EXPECT_EQ(pthread_cond_timedwait(condition.native_handle(), mutex.native_handle(), &past), ETIMEDOUT);
+    EXPECT_EQ(pthread_mutex_timedlock(mutex.native_handle(), &past), ETIMEDOUT);
+    EXPECT_EQ(pthread_mutex_clocklock(mutex.native_handle(), CLOCK_MONOTONIC, &past), ETIMEDOUT);
+    EXPECT_EQ(counted(), 3U);
     int word = 0;
+    EXPECT_EQ(syscall(SYS_futex, &word, FUTEX_LOCK_PI_PRIVATE, 0, nullptr, nullptr, 0), 0);
+    EXPECT_EQ(counted(), 1U);
+    EXPECT_EQ(syscall(SYS_futex, &word, FUTEX_UNLOCK_PI_PRIVATE, 0, nullptr, nullptr, 0), 0);
+    word = 0;
     EXPECT_EQ(syscall(SYS_futex, &word, FUTEX_WAIT_PRIVATE, 1, nullptr, nullptr, 0), -1) << "not what it waits for";
     EXPECT_EQ(counted(), 1U);
     EXPECT_EQ(syscall(SYS_futex, &word, FUTEX_WAKE_PRIVATE, 1, nullptr, nullptr, 0), 0);

@@ -68,6 +68,31 @@ QIVO_SHOWN int pthread_cond_clockwait(pthread_cond_t* condition, pthread_mutex_t
     return counted(function, "pthread_cond_clockwait", condition, mutex, clock, until);
 }
 
+QIVO_SHOWN int pthread_cond_timedwait(pthread_cond_t* condition, pthread_mutex_t* mutex, const timespec* until) {
+    static int (*function)(pthread_cond_t*, pthread_mutex_t*, const timespec*) = nullptr;
+    return counted(function, "pthread_cond_timedwait", condition, mutex, until);
+}
+
+QIVO_SHOWN int pthread_mutex_timedlock(pthread_mutex_t* mutex, const timespec* until) noexcept {
+    static int (*function)(pthread_mutex_t*, const timespec*) = nullptr;
+    return counted(function, "pthread_mutex_timedlock", mutex, until);
+}
+
+QIVO_SHOWN int pthread_mutex_clocklock(pthread_mutex_t* mutex, clockid_t clock, const timespec* until) noexcept {
+    static int (*function)(pthread_mutex_t*, clockid_t, const timespec*) = nullptr;
+    return counted(function, "pthread_mutex_clocklock", mutex, clock, until);
+}
+
+QIVO_SHOWN int sem_timedwait(sem_t* semaphore, const timespec* until) {
+    static int (*function)(sem_t*, const timespec*) = nullptr;
+    return counted(function, "sem_timedwait", semaphore, until);
+}
+
+QIVO_SHOWN int sem_clockwait(sem_t* semaphore, clockid_t clock, const timespec* until) {
+    static int (*function)(sem_t*, clockid_t, const timespec*) = nullptr;
+    return counted(function, "sem_clockwait", semaphore, clock, until);
+}
+
 QIVO_SHOWN int sem_wait(sem_t* semaphore) {
     static int (*function)(sem_t*) = nullptr;
     return counted(function, "sem_wait", semaphore);
@@ -87,7 +112,8 @@ QIVO_SHOWN long syscall(long number, ...) noexcept {
     }
     va_end(list);
     const long operation = arguments[1] & FUTEX_CMD_MASK;
-    if (number == SYS_futex && (operation == FUTEX_WAIT || operation == FUTEX_WAIT_BITSET)) {
+    if (number == SYS_futex && (operation == FUTEX_WAIT || operation == FUTEX_WAIT_BITSET ||
+                                operation == FUTEX_LOCK_PI || operation == FUTEX_LOCK_PI2)) {
         ++waits;
     }
     return function(number, arguments[0], arguments[1], arguments[2], arguments[3], arguments[4], arguments[5]);
