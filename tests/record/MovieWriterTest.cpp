@@ -75,7 +75,8 @@ TEST_F(MovieWriterTest, PicturesAndSoundOfTwoThreadsAreWrittenWhileAThirdLooksOn
         }
     });
     EXPECT_TRUE(eventually([this] { return m_writer->status().pictures > 50; }));
-    EXPECT_EQ(m_writer->status().bytes, std::filesystem::file_size(m_path));
+    const std::uint64_t told = m_writer->status().bytes;
+    EXPECT_LE(told, std::filesystem::file_size(m_path)) << "which grows meanwhile";
     pictures.join();
     sounds.join();
     m_writer->finish();
@@ -111,7 +112,7 @@ TEST_F(MovieWriterTest, ADiskThatDoesNotComeBackIsToldAndWhatGoesBeyondTheBoundI
         EXPECT_TRUE(eventually([this] { return m_writer->status().diskIsSlow; }));
         const std::vector<std::uint8_t> large(std::size_t{3} << 20U);
         std::size_t taken = 0;
-        while (m_writer->add(SoundPiece{large, seconds(50)}, kSound)) {
+        while (taken < 100 && m_writer->add(SoundPiece{large, seconds(50)}, kSound)) {
             ++taken;
         }
         EXPECT_EQ(taken, (MovieWriter::mostWaiting + large.size() - 1) / large.size());

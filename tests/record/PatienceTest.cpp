@@ -1,6 +1,7 @@
 // The recorder as a process, for as long as it waits for a source that was there.
 #include "tests/record/RecorderProcess.h"
 
+#include <cstdio>
 #include <gtest/gtest.h>
 
 namespace qivo::test {
@@ -17,7 +18,14 @@ TEST(RecorderPatience, EndsByItselfWithAFinishedMovieAMinuteAfterTheSourceHasGon
               "Application.Mac.QIVO.Recording: \"STUDIO (Cam 1)\" has gone: the movie is finished\n");
     const DecodedMovie movie = recorder.movie();
     EXPECT_TRUE(movie.readable) << movie.error;
-    EXPECT_EQ(movie.pictures.size(), 12U);
+    // The source makes twelve. Those that come at once because the encoder was slow to start may be left out, and are
+    // told.
+    unsigned pictures = 0;
+    unsigned dropped = 0;
+    ASSERT_EQ(std::sscanf(recorder.lastProgress().c_str(), "time %*s pictures %u dropped %u", &pictures, &dropped), 2);
+    EXPECT_EQ(pictures + dropped, 12U);
+    EXPECT_GE(pictures, 6U);
+    EXPECT_EQ(movie.pictures.size(), pictures);
 }
 
 } // namespace

@@ -33,9 +33,10 @@ TEST(RecorderOnTheNetwork, ThePublishedClockAndToneRunThroughTheMovie) {
         EXPECT_NEAR(picture.time - middle.time, static_cast<double>(*picture.published - *middle.published) * 1e-3,
                     0.040);
     }
-    // The publisher draws thirty a second, and what it draws is there.
+    // The publisher draws thirty a second, and what it draws is there. On a busy machine one may be replaced by the
+    // next before it is taken, or drawn a tick late.
     const auto span = *movie.pictures.back().published - *movie.pictures.front().published;
-    EXPECT_EQ(static_cast<long>(movie.pictures.size()), std::lround(static_cast<double>(span) * 30e-3) + 1);
+    EXPECT_NEAR(static_cast<double>(movie.pictures.size()), std::round(static_cast<double>(span) * 30e-3) + 1, 1);
     EXPECT_LT(movie.soundJump, 0.001);
     EXPECT_NEAR(movie.soundEnd(), movie.pictures.back().time, 0.3);
     // Its first channel, without a break once the first packets have come. Where the machine is busy single samples are

@@ -343,14 +343,13 @@ TEST(Recorder, AFolderThatIsDeletedMeanwhileIsOneLineAndAFailure) {
                                          "\" ends here: it has been deleted\n");
 }
 
-TEST(Recorder, ProgressComesFromTheBeginningAndWhileTheMovieIsFinished) {
+TEST(Recorder, ProgressComesFromTheBeginning) {
     // GStreamer looks through all its plug-ins first, which takes it a while.
     RecorderProcess recorder(kBoth, "A", "GST_REGISTRY=\"$folder/../registry\" exec \"$@\"");
-    const auto began = std::chrono::steady_clock::now();
-    ASSERT_TRUE(recorder.process().waitForOutput("waiting for the source\n"));
-    EXPECT_LT(std::chrono::steady_clock::now() - began, milliseconds(250));
     ASSERT_TRUE(recorder.waitForLength(milliseconds(600))) << recorder.process().errors();
     EXPECT_EQ(recorder.interrupt(), 0);
+    const std::string waiting = "time 00:00:00.000 pictures 0 dropped 0 bytes 0 waiting for the source\n";
+    EXPECT_THAT(recorder.process().output(), testing::StartsWith(waiting + waiting));
 }
 
 TEST(Recorder, WhileItPreparesItCanBeEnded) {
