@@ -415,6 +415,7 @@ TEST_F(RealSoundTest, SdlPlaysWhereASoundServerLetsNobodyIn) {
     EXPECT_THAT(told, ElementsAre(StartsWith("Sound plays through a device through SDL (dummy); no sound server (")));
     EXPECT_GT(turnedAway, 0);
     player->stopPlayback();
+    knock.setEnabled(false);
     close(listener);
     EXPECT_TRUE(EventLoop::until([] { return SDL_WasInit(0) == 0; }));
 }
