@@ -39,8 +39,9 @@ class PictureEncoder {
     };
     /** Takes a picture that belongs at that time, later than the one before. The frame can be given back after. */
     [[nodiscard]] Taken encode(const QIVOlib_video_frame_v2_t& frame, Nanoseconds time);
-    /** Waits until all that was taken has been handed on, but not longer than `limit`. Nothing is encoded or handed on
-     *  after. How many pictures were taken and will not be handed on. */
+    /** Waits until all that was taken has been handed on, but not longer than `limit` plus what a picture that is
+     *  being handed on waits for the disk. Nothing is encoded or handed on after. How many pictures were taken and
+     *  will not be handed on. */
     std::uint64_t finish(Nanoseconds limit);
 
     /** The name of the encoder's element. */

@@ -11,7 +11,8 @@ namespace qivo::record {
 struct Progress {
     Nanoseconds length{};       ///< of the movie
     std::uint64_t pictures = 0; ///< written
-    std::uint64_t dropped = 0;  ///< received, but left out because encoder or disk were behind
+    std::uint64_t dropped = 0;  ///< received, but left out: encoder or disk were behind, they could not be read, or the
+                                ///< encoder had taken them when it failed or ended
     std::uint64_t bytes = 0;    ///< of the file
     Nanoseconds soundLost{};    ///< received, but left out because the disk was behind
     std::string waiting;        ///< why it does not go on just now; empty if it does
