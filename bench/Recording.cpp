@@ -30,6 +30,7 @@ constexpr const char* kSource = "BENCH (Live)";
 void useProcessors(int count) {
     cpu_set_t all;
     cpu_set_t some;
+    CPU_ZERO(&all);
     CPU_ZERO(&some);
     sched_getaffinity(0, sizeof(all), &all);
     for (int i = 0; i < CPU_SETSIZE && count > 0; ++i) {

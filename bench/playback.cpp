@@ -4,6 +4,7 @@
 // turns, and the ratio is the median of the rounds' own. Ends with 1 if the callback allocated anything.
 
 #include "audio/AudioPlayback.h"
+#include "bench/Timing.h"
 #include "tests/audio/AllocationCount.h"
 #include "tests/audio/SteadySource.h"
 
@@ -117,12 +118,6 @@ class Bare {
     std::vector<float> m_stereo;
     std::array<qivo::AudioResampler, 2> m_resamplers;
 };
-
-double median(std::vector<double> values) {
-    const auto middle = values.begin() + static_cast<std::ptrdiff_t>(values.size() / 2);
-    std::nth_element(values.begin(), middle, values.end());
-    return *middle;
-}
 
 /// Returns how often the callback allocated.
 std::uint64_t measure(std::int32_t rate, std::int32_t channels, std::int32_t samples) {
