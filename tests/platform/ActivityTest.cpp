@@ -211,7 +211,7 @@ TEST(Activity, IsSilentWhereThereIsNoBus) {
     EXPECT_THAT(testing::internal::GetCapturedStderr(), IsEmpty());
 }
 
-TEST(Activity, EndsAtOnceWhereBothBusesHangUp) {
+TEST(Activity, EndsAtOnceWhereBothBusesRefuseTheConnection) {
     const std::string path = testing::TempDir() + "qivo-rude-bus-" + std::to_string(getpid());
     sockaddr_un address{};
     address.sun_family = AF_UNIX;
@@ -221,16 +221,22 @@ TEST(Activity, EndsAtOnceWhereBothBusesHangUp) {
     ASSERT_EQ(listen(listener, 2), 0);
     qputenv("DBUS_SESSION_BUS_ADDRESS", ("unix:path=" + path).c_str());
     qputenv("DBUS_SYSTEM_BUS_ADDRESS", ("unix:path=" + path).c_str());
+    std::array<int, 2> connections{};
     std::chrono::steady_clock::time_point ended;
     {
         const Activity activity("realtime UDP receiving");
-        close(accept(listener, nullptr, nullptr));
-        close(accept(listener, nullptr, nullptr));
+        const std::string refusal = "REJECTED\r\nREJECTED\r\nREJECTED\r\n"; // as many lines as answers are due
+        for (int& connection : connections) {
+            connection = accept(listener, nullptr, nullptr);
+            EXPECT_EQ(write(connection, refusal.data(), refusal.size()), static_cast<ssize_t>(refusal.size()));
+        }
         std::this_thread::sleep_for(std::chrono::milliseconds(100));
         ended = std::chrono::steady_clock::now();
     }
     EXPECT_LT(std::chrono::steady_clock::now() - ended, std::chrono::milliseconds(Activity::kEndTimeoutMs / 2));
-    close(listener);
+    for (const int descriptor : {connections[0], connections[1], listener}) {
+        close(descriptor);
+    }
     unlink(path.c_str());
 }
 
