@@ -8,7 +8,6 @@
 #include "tests/audio/AllocationCount.h"
 #include "tests/audio/SteadySource.h"
 
-#include <algorithm>
 #include <array>
 #include <cmath>
 #include <cstddef>
