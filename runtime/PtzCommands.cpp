@@ -17,6 +17,10 @@ bool isMotion(const PtzRequest& request) {
     return request.kind == Kind::move || request.kind == Kind::recall;
 }
 
+bool isRecall(const PtzRequest& request) {
+    return request.kind == Kind::recall;
+}
+
 void put(PtzSpeed& speed, unsigned axes, const PtzSpeed& from) {
     if ((axes & kPanTiltAxes) != 0) {
         speed.pan = from.pan;
@@ -122,7 +126,7 @@ void PtzCommands::end(Clock::time_point now) {
     }
     m_waiting.clear();
     forgetRecall();
-    m_stop |= m_moving | m_gliding;
+    m_stop |= m_moving | gliding(now);
     m_endLimit = now + kEndLimit;
 }
 
@@ -163,6 +167,11 @@ PtzRequest PtzCommands::beginPair(unsigned axes) {
 
 bool PtzCommands::laneFree() const {
     return m_asked.empty() && m_pairs.empty() && !m_ended;
+}
+
+/// Axes that may still be on their way to a preset. Whoever moves the camera after that is not to be stopped.
+unsigned PtzCommands::gliding(Clock::time_point now) const {
+    return now < m_recallEnd ? m_gliding : 0;
 }
 
 /// When the move that holds is to be asked again.
@@ -227,7 +236,11 @@ void PtzCommands::done(std::uint64_t id, bool accepted, Clock::time_point now) {
     const auto asked =
         std::find_if(m_asked.begin(), m_asked.end(), [id](const PtzRequest& request) { return request.id == id; });
     if (asked != m_asked.end()) {
+        const bool isRefused = asked->kind == Kind::recall && !accepted && m_overtaken == 0;
         m_asked.erase(asked);
+        if (isRefused && std::none_of(m_waiting.begin(), m_waiting.end(), isRecall)) {
+            forgetRecall();
+        }
         m_echo |= m_overtaken;
         m_overtaken = m_asked.empty() ? 0 : m_overtaken;
         return;
@@ -274,8 +287,9 @@ bool PtzCommands::finished(Clock::time_point now) const {
     return m_ended && (quiet || now >= m_endLimit);
 }
 
-bool PtzCommands::moving() const {
-    return m_moving != 0 || !m_asked.empty() || !m_pairs.empty() || (m_stop | m_echo | m_again) != 0;
+bool PtzCommands::busy(Clock::time_point now) const {
+    return (m_moving | gliding(now) | m_stop | m_echo | m_again) != 0 || !m_waiting.empty() || !m_asked.empty() ||
+           !m_pairs.empty();
 }
 
 } // namespace qivo::runtime

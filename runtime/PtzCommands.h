@@ -50,7 +50,8 @@ struct PtzRequest {
 /// where neither was accepted; and once more when a move that it overtook on the way has been answered, because the
 /// camera may have taken them in the other order. Nothing moves before a stop has been answered or given up.
 /// A stop of the zoom alone does not do away with a recall that no speed followed: it comes from a pointer that passes
-/// a button, and would leave the camera with the zoom of another place. The recall is asked once more after it.
+/// a button, and would leave the camera with the zoom of another place. The recall is asked once more after it, unless
+/// the camera has refused it.
 ///
 /// Thread: one at a time.
 class PtzCommands {
@@ -87,12 +88,13 @@ class PtzCommands {
     bool store(int preset);
     bool recall(int preset, float speed);
 
-    /// Nothing is accepted any more; what moves is stopped, and what may be on its way to a preset.
+    /// Nothing is accepted any more; what moves is stopped, and what may still be on its way to a preset.
     void end(Clock::time_point now);
 
     /// What to ask now; to be called until there is nothing.
     std::optional<PtzRequest> next(Clock::time_point now);
-    /// A request has been answered or given up.
+    /// A request has been answered or given up. A recall that is not accepted is not asked again after a stop, so that
+    /// one whose answer is lost, which the camera may be doing, counts as accepted.
     void done(std::uint64_t id, bool accepted, Clock::time_point now);
     /// Whether a recall that is being asked still counts: nobody has stopped the camera since.
     bool stillWanted(std::uint64_t id) const;
@@ -100,8 +102,8 @@ class PtzCommands {
     Clock::time_point nextLook() const;
     /// Whether all is done after the end.
     bool finished(Clock::time_point now) const;
-    /// Whether the camera moves, or may still do.
-    bool moving() const;
+    /// Whether the camera moves or is on its way to a preset, or may still be, or commands have not been answered.
+    bool busy(Clock::time_point now) const;
 
   private:
     /// A stop under way.
@@ -125,6 +127,7 @@ class PtzCommands {
     PtzRequest beginMove(const PtzRequest& request, Clock::time_point now);
     void pairDone(const Pair& pair, Clock::time_point now);
     bool laneFree() const;
+    unsigned gliding(Clock::time_point now) const;
     Clock::time_point renewal() const;
 
     std::deque<PtzRequest> m_waiting;

@@ -316,9 +316,10 @@ void Steering::done(const PtzRequest& request, const SoapClient::Answer& answer)
     if (!answer.accepted()) {
         report(answer.failure);
     }
+    const bool mayBeDone = request.kind == Kind::recall && answer.status == 0;
     {
         const std::lock_guard guard(m_mutex);
-        m_commands.done(request.id, answer.accepted(), Clock::now());
+        m_commands.done(request.id, answer.accepted() || mayBeDone, Clock::now());
     }
     m_finished.notify_all();
 }

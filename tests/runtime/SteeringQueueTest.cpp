@@ -118,9 +118,9 @@ TEST_F(SteeringQueue, AStopIsAskedBothWaysAndEndsTheRenewal) {
     ASSERT_EQ(kinds(), kStop);
     EXPECT_EQ(m_last[0].axes, runtime::kPanTiltAxes);
     EXPECT_EQ(m_last[1].speed.pan, 0);
-    EXPECT_TRUE(m_commands.moving());
+    EXPECT_TRUE(m_commands.busy(m_now));
     answer();
-    EXPECT_FALSE(m_commands.moving());
+    EXPECT_FALSE(m_commands.busy(m_now));
     m_now += 1h;
     EXPECT_EQ(asked().size(), 0U);
 }
@@ -190,7 +190,7 @@ TEST_F(SteeringQueue, AMoveThatWasOvertakenIsStoppedOnceMore) {
     answer();
     m_now += 1h;
     EXPECT_EQ(asked().size(), 0U);
-    EXPECT_FALSE(m_commands.moving());
+    EXPECT_FALSE(m_commands.busy(m_now));
 }
 
 TEST_F(SteeringQueue, AStopThatNothingAcceptsIsAskedAgainButNotForEver) {
@@ -382,6 +382,30 @@ TEST_F(SteeringQueue, ARecallIsNotAskedAgainAfterASpeedOrAnotherStopOrMuchLater)
     EXPECT_EQ(asked().size(), 0U) << "it has long arrived";
 }
 
+TEST_F(SteeringQueue, ARecallThatIsRefusedIsNotAskedAgain) {
+    EXPECT_TRUE(m_commands.recall(2, 1));
+    ASSERT_EQ(kinds(), std::vector{Kind::recall});
+    answer(false);
+    EXPECT_TRUE(m_commands.zoom(0));
+    ASSERT_EQ(kinds(), kStop);
+    answer();
+    EXPECT_EQ(asked().size(), 0U) << "there is no such preset";
+}
+
+TEST_F(SteeringQueue, ARefusalDoesAwayWithNoNewerRecall) {
+    EXPECT_TRUE(m_commands.recall(2, 1));
+    ASSERT_EQ(kinds(), std::vector{Kind::recall});
+    EXPECT_TRUE(m_commands.recall(3, 1));
+    answer(false);
+    ASSERT_EQ(kinds(), std::vector{Kind::recall});
+    answer();
+    EXPECT_TRUE(m_commands.zoom(0));
+    ASSERT_EQ(kinds(), kStop);
+    answer();
+    ASSERT_EQ(kinds(), std::vector{Kind::recall});
+    EXPECT_EQ(m_last[0].preset, 3);
+}
+
 /// Some cameras answer a move only when it has been done, and stop by themselves meanwhile.
 TEST_F(SteeringQueue, AMoveThatHoldsIsRenewedBesideOneThatIsNotAnswered) {
     EXPECT_TRUE(m_commands.move(0.5F, 0));
@@ -421,7 +445,7 @@ TEST_F(SteeringQueue, AStopIsRepeatedUntilBothMovesThatItOvertookAreAnswered) {
     }
     m_now += 1h;
     EXPECT_EQ(asked().size(), 0U);
-    EXPECT_FALSE(m_commands.moving());
+    EXPECT_FALSE(m_commands.busy(m_now));
 }
 
 TEST_F(SteeringQueue, TheEndStopsWhatMoves) {
@@ -473,6 +497,20 @@ TEST_F(SteeringQueue, TheEndStopsARecall) {
     ASSERT_EQ(kinds(), kStop);
     EXPECT_EQ(m_last[0].axes, runtime::kPanTiltAxes) << "the zoom stands";
     answer();
+    EXPECT_TRUE(m_commands.finished(m_now));
+}
+
+/// Somebody else may move it by then.
+TEST_F(SteeringQueue, TheEndLeavesACameraAloneThatHasLongArrived) {
+    EXPECT_TRUE(m_commands.recall(1, 1));
+    EXPECT_EQ(kinds(), std::vector{Kind::recall});
+    answer();
+    m_now += PtzCommands::kRecallTime - 1ms;
+    EXPECT_TRUE(m_commands.busy(m_now));
+    m_now += 1ms;
+    EXPECT_FALSE(m_commands.busy(m_now));
+    m_commands.end(m_now);
+    EXPECT_EQ(asked().size(), 0U);
     EXPECT_TRUE(m_commands.finished(m_now));
 }
 
