@@ -14,6 +14,11 @@ constexpr std::size_t kMostStreams = 32;
 
 } // namespace
 
+bool OnvifCamera::isLike(const OnvifCamera& other) const {
+    return services == other.services && profile == other.profile && videoSource == other.videoSource &&
+           node == other.node && imaging == other.imaging && focus == other.focus;
+}
+
 OnvifProbe::OnvifProbe(SoapClient& client, const SteeringTarget& target, std::function<bool()> ended)
     : m_client(client), m_target(target), m_ended(std::move(ended)) {}
 

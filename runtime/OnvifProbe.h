@@ -21,6 +21,9 @@ struct OnvifCamera {
     std::vector<onvif::Preset> presets;
     bool imaging = false;              ///< has an imaging service for its pictures
     std::optional<onvif::Range> focus; ///< nothing if the focus cannot be put to a position
+
+    /// Whether it takes the same commands. Presets come and go and are looked up again.
+    bool isLike(const OnvifCamera& other) const;
 };
 
 /// Asks a device whether and how the source is steered.

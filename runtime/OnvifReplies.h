@@ -18,6 +18,8 @@ struct Services {
     std::string media;
     std::string ptz;
     std::string imaging;
+
+    bool operator==(const Services&) const = default;
 };
 
 struct Profile {
@@ -32,6 +34,8 @@ struct Node {
     bool panTilt = true;
     bool zoom = true;
     bool speeds = false; ///< takes a speed with a preset
+
+    bool operator==(const Node&) const = default;
 };
 
 struct Preset {
@@ -42,6 +46,8 @@ struct Preset {
 struct Range {
     float least = 0;
     float most = 1;
+
+    bool operator==(const Range&) const = default;
 };
 
 /// The device's UTC clock.

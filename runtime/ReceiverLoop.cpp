@@ -56,10 +56,6 @@ std::string ReceiverLoop::webControl() const {
 
 std::shared_ptr<Steering> ReceiverLoop::steering() const {
     const std::lock_guard guard(m_mutex);
-    if (m_successor && m_successor->isSupported()) {
-        m_steering->end();
-        m_steering = std::exchange(m_successor, nullptr);
-    }
     return m_steering && m_steering->isSupported() ? m_steering : nullptr;
 }
 
@@ -136,8 +132,11 @@ void ReceiverLoop::steer(bool anew) {
         return;
     }
     if (target && m_steering && !m_steering->isOver() && m_steering->target() == *target) {
-        if (anew && m_steering->isSupported() && (!m_successor || m_successor->isOver())) {
-            m_successor = Steering::start(std::move(*target), [] {});
+        if (anew && m_steering->isSupported()) {
+            if (m_successor) {
+                m_successor->end(); // what it was told before this restart is out of date, too
+            }
+            m_successor = Steering::start(std::move(*target), [wakeup = m_wakeup] { wakeup->notify(); });
         }
         return;
     }
@@ -149,12 +148,25 @@ void ReceiverLoop::steer(bool anew) {
     }
 }
 
+/// Lets the successor steer once it has its answers. The end of the other one stops a camera that moves, so that it
+/// waits for one that is the same as before to stand. One that has changed understands the other one no more.
+void ReceiverLoop::succeed() {
+    const std::lock_guard guard(m_mutex);
+    const bool isReady = m_successor && m_successor->isSupported();
+    if (!isReady || (m_steering->isBusy() && m_steering->knowsTheSame(*m_successor))) {
+        return;
+    }
+    m_steering->end();
+    m_steering = std::exchange(m_successor, nullptr);
+}
+
 std::string ReceiverLoop::target(bool first) const {
     return targetUrl(m_request, m_announcement, first);
 }
 
 void ReceiverLoop::pause() {
     const std::uint64_t seen = m_wakeup->count();
+    succeed();
     if (m_stopped || m_announcementsChanged) {
         return;
     }
@@ -186,6 +198,7 @@ ReceiverLoop::Outcome ReceiverLoop::watch(const RtspSession& session, const std:
     while (!m_stopped) {
         const std::uint64_t seen = m_wakeup->count();
         refreshAnnouncement();
+        succeed();
         if (const auto lastPacket = session.lastPacket(); !connected && lastPacket) {
             connected = true;
             m_reported.clear();

@@ -76,6 +76,7 @@ class ReceiverLoop {
     std::string target(bool first) const;
     void endSteering();
     void steer(bool anew = false);
+    void succeed();
     Outcome attempt(const std::string& url, bool tcp);
     Outcome watch(const RtspSession& session, const std::string& url, bool tcp);
     void end(std::shared_ptr<RtspSession> session);
@@ -113,8 +114,8 @@ class ReceiverLoop {
     mutable std::mutex m_mutex; // protects the rest
     std::string m_web;
     std::string m_onvif;
-    mutable std::shared_ptr<Steering> m_steering;
-    mutable std::shared_ptr<Steering> m_successor; ///< asks the same device anew; takes over once it has its answers
+    std::shared_ptr<Steering> m_steering;
+    std::shared_ptr<Steering> m_successor; ///< asks the same device anew; takes over once it has its answers
 };
 
 } // namespace qivo::runtime

@@ -86,6 +86,11 @@ bool Steering::isSupported() const {
     return m_camera && !m_ended;
 }
 
+bool Steering::isBusy() const {
+    const std::lock_guard guard(m_mutex);
+    return m_commands.busy(Clock::now());
+}
+
 /// `able` tells whether the camera can do it at all.
 template <typename Able, typename Command>
 bool Steering::command(const Able& able, const Command& take) {

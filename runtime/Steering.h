@@ -48,6 +48,11 @@ class Steering : public std::enable_shared_from_this<Steering> {
     /// Whether it has been found that there is no camera, or the end has come.
     bool isOver() const { return m_over; }
 
+    /// Whether the camera moves as it was told here, or has been told and has not answered.
+    bool isBusy() const;
+    /// Whether both have found the same camera, which each has. Its presets may differ.
+    bool knowsTheSame(const Steering& other) const { return m_camera->isLike(*other.m_camera); }
+
     // Each answers whether the command was accepted for sending. Speeds are libqivo's.
     bool panTilt(float pan, float tilt);
     bool zoom(float speed);

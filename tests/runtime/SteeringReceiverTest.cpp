@@ -44,6 +44,15 @@ class SteeringReceiverTest : public ReceiverFixture {
         return address;
     }
 
+    /// Sends nothing until the receiver has connected anew, and then pictures again.
+    void comeBack(runtime::Receiver& receiver) {
+        const int connections = m_source.connections();
+        m_source.setSilent(true);
+        ASSERT_TRUE(ScriptedCamera::until([&] { return m_source.connections() > connections; }));
+        m_source.setSilent(false);
+        ASSERT_TRUE(nextPicture(receiver));
+    }
+
     RtspServer m_source{{.launch = h264(kPicture)}};
 };
 
@@ -110,32 +119,74 @@ TEST_F(SteeringReceiverTest, AnAnnouncementThatLeadsElsewhereStopsTheCameraThatW
     EXPECT_FALSE(first.moves());
 }
 
-/// It was switched off meanwhile, and what it told of itself may be out of date.
-TEST_F(SteeringReceiverTest, ACameraIsAskedAnewWhenItsSourceHasComeBack) {
-    auto restarted = std::make_shared<std::atomic<bool>>(false);
-    ScriptedCamera camera([restarted](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
-        if (!*restarted) {
+/// As after a restart with other settings.
+ScriptedCamera::Quirk renamingItsProfile(const std::shared_ptr<std::atomic<bool>>& renamed) {
+    return [renamed](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
+        if (!*renamed) {
             return false;
         }
         const bool isOld = call.body.find("ProfileToken>dome<") != std::string::npos;
         const std::string answer = isOld ? self.fault("no such profile", "ter:NoProfile") : self.answerTo(call);
         return connection.send(self.http(std::regex_replace(answer, std::regex("token=\"dome\""), "token=\"dome2\"")));
-    });
+    };
+}
+
+/// It was switched off meanwhile, and what it told of itself may be out of date.
+TEST_F(SteeringReceiverTest, ACameraIsAskedAnewWhenItsSourceHasComeBack) {
+    auto restarted = std::make_shared<std::atomic<bool>>(false);
+    ScriptedCamera camera(renamingItsProfile(restarted));
     const auto receiver = receive("", "STUDIO (Dome)");
     announce(camera.url());
     ASSERT_TRUE(offersSteering(*receiver));
     ASSERT_TRUE(nextPicture(*receiver));
-    const int connections = m_source.connections();
     *restarted = true;
-    m_source.setSilent(true);
-    ASSERT_TRUE(camera.until([&] { return m_source.connections() > connections; }));
-    m_source.setSilent(false);
-    ASSERT_TRUE(nextPicture(*receiver));
+    ASSERT_NO_FATAL_FAILURE(comeBack(*receiver));
     EXPECT_TRUE(receiver->steering()) << "it was never without";
     ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") == 2; }));
     EXPECT_TRUE(camera.until([&] {
         const auto steering = receiver->steering();
         return steering && steering->panTilt(0.5F, 0) && camera.until([&] { return camera.moves(); }, 200ms);
+    }));
+    EXPECT_EQ(camera.calls("ContinuousMove").back().after("ProfileToken>"), "dome2");
+}
+
+TEST_F(SteeringReceiverTest, ARecallGoesOnWhenItsSourceHasComeBack) {
+    ScriptedCamera camera;
+    camera.setPreset("7", "QIVO 7");
+    const auto receiver = receive("", "STUDIO (Dome)");
+    announce(camera.url());
+    ASSERT_TRUE(offersSteering(*receiver));
+    ASSERT_TRUE(nextPicture(*receiver));
+    const auto before = receiver->steering();
+    EXPECT_TRUE(before->recall(7, 0.25F));
+    ASSERT_TRUE(camera.until([&] { return camera.glides(); }));
+    ASSERT_NO_FATAL_FAILURE(comeBack(*receiver));
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") == 2; }));
+    EXPECT_FALSE(camera.until([&] { return receiver->steering() != before; }, 500ms));
+    EXPECT_TRUE(receiver->steering()->recall(7, 0.25F));
+    ASSERT_TRUE(camera.until([&] { return camera.count("GotoPreset") == 2; }));
+    EXPECT_FALSE(camera.until([&] { return camera.count("Stop") != 0; }, 500ms)) << "it ended half way";
+    EXPECT_TRUE(before->panTilt(0, 0));
+    EXPECT_TRUE(before->zoom(0));
+    EXPECT_TRUE(camera.until([&] { return receiver->steering() != before; })) << "the camera stands";
+}
+
+/// The first return is not over yet where the camera still moves.
+TEST_F(SteeringReceiverTest, ACameraIsAskedAnewAtEveryReturnOfItsSource) {
+    auto restarted = std::make_shared<std::atomic<bool>>(false);
+    ScriptedCamera camera(renamingItsProfile(restarted));
+    const auto receiver = receive("", "STUDIO (Dome)");
+    announce(camera.url());
+    ASSERT_TRUE(offersSteering(*receiver));
+    ASSERT_TRUE(nextPicture(*receiver));
+    EXPECT_TRUE(receiver->steering()->panTilt(0.5F, 0));
+    ASSERT_NO_FATAL_FAILURE(comeBack(*receiver));
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") == 2; }));
+    *restarted = true;
+    ASSERT_NO_FATAL_FAILURE(comeBack(*receiver));
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") == 3; }));
+    EXPECT_TRUE(camera.until([&] {
+        return receiver->steering()->zoom(0.5F) && camera.until([&] { return camera.speed().zoom == 0.5F; }, 200ms);
     }));
     EXPECT_EQ(camera.calls("ContinuousMove").back().after("ProfileToken>"), "dome2");
 }
