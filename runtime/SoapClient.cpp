@@ -214,16 +214,19 @@ void SoapClient::post(const std::string& url, const SoapMessage& message, std::c
     });
 }
 
-/// Calls `then` when the clock has been read, or at once where that was a moment ago.
+/// Calls `then` when the clock has been read, at `end` at the latest; at once where it was read a moment ago, or where
+/// a reading under way may take longer than that.
 void SoapClient::readClock(Clock::time_point end, std::function<void()> then) {
-    if (m_awaitsClock.empty() && Clock::now() < m_nextClock) {
+    const Clock::time_point now = Clock::now();
+    if (m_awaitsClock.empty() ? now < m_nextClock : end < m_clockEnd) {
         then();
         return;
     }
     m_awaitsClock.push_back(std::move(then));
     if (m_awaitsClock.size() == 1) {
-        m_nextClock = Clock::now() + kClockPause;
-        begin(m_target.device, onvif::getSystemDateAndTime(), end, [this](const Answer& answer) {
+        m_nextClock = now + kClockPause;
+        m_clockEnd = std::min(end, now + kClockLimit);
+        begin(m_target.device, onvif::getSystemDateAndTime(), m_clockEnd, [this](const Answer& answer) {
             takeClock(answer);
             clockRead();
         });

@@ -34,6 +34,8 @@ class SoapClient {
     static constexpr int kMostRedirections = 2;
     /// How often the clock of a device that refuses logins is read; a stop is asked for longer than that.
     static constexpr std::chrono::milliseconds kClockPause{500};
+    /// The longest that a device may take to tell its clock, while messages wait for that.
+    static constexpr std::chrono::milliseconds kClockLimit{500};
     /// What the clock has to be off for a login to be worth another try: devices tell whole seconds.
     static constexpr std::chrono::seconds kClockStep{2};
 
@@ -91,6 +93,7 @@ class SoapClient {
     const SteeringTarget m_target;
     std::chrono::system_clock::duration m_ahead{};    ///< the device's clock from ours
     Clock::time_point m_nextClock{};                  ///< when it may be read again
+    Clock::time_point m_clockEnd{};                   ///< when the reading is given up
     std::vector<std::function<void()>> m_awaitsClock; ///< while it is being read
     std::unique_ptr<SoupSession, Release> m_session;
     std::list<std::unique_ptr<Exchange>> m_exchanges;

@@ -1,11 +1,14 @@
 // A camera is steered, by the clock: scripted cameras on loopback.
 
 #include "runtime/BackgroundThreads.h"
+#include "runtime/OnvifMessages.h"
 #include "tests/runtime/SteeringFixture.h"
 
+#include <glib.h>
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -383,6 +386,59 @@ TEST_F(SteeringCameraTest, ALoginThatIsRefusedForAnotherReasonIsNotTriedAgain) {
     const auto pauses = (Clock::now() - began) / runtime::SoapClient::kClockPause;
     EXPECT_LE(camera.count("GetSystemDateAndTime"), 2 + pauses);
     EXPECT_EQ(camera.count("SetImagingSettings"), 20);
+}
+
+/// Refuses every login from then on, and says nothing more of its clock.
+ScriptedCamera::Quirk losingItsClock(const std::shared_ptr<std::atomic<bool>>& lost) {
+    return [lost](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
+        if (*lost && call.operation == "GetSystemDateAndTime") {
+            connection.untilClosed();
+            return true;
+        }
+        return lost->load() && connection.send(self.http("", "401 Unauthorized"));
+    };
+}
+
+TEST_F(SteeringCameraTest, AStopDoesNotWaitForAClockThatSomethingElseReads) {
+    auto lost = std::make_shared<std::atomic<bool>>(false);
+    ScriptedCamera camera(losingItsClock(lost));
+    const auto steering = steer(camera, "ann:secret");
+    ASSERT_TRUE(found(*steering));
+    *lost = true;
+    const int clocks = camera.count("GetSystemDateAndTime");
+    EXPECT_TRUE(steering->autoFocus());
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetSystemDateAndTime") > clocks; }));
+    EXPECT_TRUE(steering->panTilt(0, 0));
+    ASSERT_TRUE(camera.until([&] { return camera.count("Stop") == 2; })) << "none is accepted";
+    EXPECT_LT(camera.calls("Stop")[1].at - camera.calls("Stop")[0].at, runtime::Steering::kStopLimit);
+}
+
+TEST_F(SteeringCameraTest, AnAnswerComesInTimeWhileTheClockIsRead) {
+    auto lost = std::make_shared<std::atomic<bool>>(true);
+    ScriptedCamera camera(losingItsClock(lost));
+    runtime::SteeringTarget target;
+    target.device = camera.url();
+    target.hosts = {"127.0.0.1"};
+    target.login = runtime::Login{"ann", "secret"};
+    target.loginHost = "127.0.0.1";
+    const std::unique_ptr<GMainContext, void (*)(GMainContext*)> context(g_main_context_new(), g_main_context_unref);
+    g_main_context_push_thread_default(context.get());
+    {
+        runtime::SoapClient client(context.get(), target);
+        bool answered = false;
+        client.post(target.device, runtime::onvif::getCapabilities(), 2s,
+                    [&](const runtime::SoapClient::Answer&) { answered = true; });
+        ASSERT_TRUE(camera.until([&] {
+            g_main_context_iteration(context.get(), FALSE);
+            return camera.count("GetSystemDateAndTime") != 0;
+        }));
+        const auto asked = Clock::now();
+        const auto answer = client.ask(target.device, runtime::onvif::getCapabilities(), 200ms, [] { return false; });
+        EXPECT_LT(Clock::now() - asked, runtime::SoapClient::kClockLimit - 100ms);
+        EXPECT_EQ(answer.failure, "HTTP status 401");
+        EXPECT_FALSE(answered) << "the clock was not being read";
+    }
+    g_main_context_pop_thread_default(context.get());
 }
 
 TEST_F(SteeringCameraTest, ACommandNeverWaitsForTheCamera) {
