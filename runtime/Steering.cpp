@@ -288,7 +288,8 @@ void Steering::usePreset(SoapClient& client, const PtzRequest& request, bool fir
 void Steering::askAnew(SoapClient& client, const PtzRequest& request, const std::string& token,
                        const SoapClient::Answer& refusal) {
     readPresets(client, [this, &client, request, token, failure = refusal.failure](SoapClient::Answer answer) {
-        if (!answer.accepted() || !m_presets.lists(token)) {
+        const bool isKnown = answer.status != 0; // where the camera says nothing, the preset may be there
+        if (isKnown && (!answer.accepted() || !m_presets.lists(token))) {
             m_presets.forget(token);
         }
         const std::string other = m_presets.tokenOf(request.preset);

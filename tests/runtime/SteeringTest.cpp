@@ -326,6 +326,30 @@ TEST_F(SteeringCameraTest, APresetThatWasTakenAwayIsStoredAnew) {
     EXPECT_EQ(camera.count("GotoPreset"), 3) << "there is no such preset any more";
 }
 
+TEST_F(SteeringCameraTest, APresetIsKeptWhereTheListDoesNotCome) {
+    auto busy = std::make_shared<std::atomic<bool>>(false);
+    ScriptedCamera camera([busy](ScriptedCamera& self, Connection& connection, const CameraCall& call) {
+        if (*busy && call.operation == "GetPresets") {
+            connection.close();
+            return true;
+        }
+        const bool isRefused = call.operation == "SetPreset" && busy->load();
+        return isRefused && connection.send(self.http(self.fault("busy"), "500 Error"));
+    });
+    camera.setPreset("5", "QIVO 3");
+    const auto steering = steer(camera);
+    ASSERT_TRUE(found(*steering));
+    *busy = true;
+    EXPECT_TRUE(steering->store(3));
+    EXPECT_TRUE(steering->autoFocus());
+    ASSERT_TRUE(camera.until([&] { return camera.count("SetImagingSettings") == 1; }));
+    EXPECT_EQ(camera.count("SetPreset"), 1) << "a second one beside it";
+    *busy = false;
+    EXPECT_TRUE(steering->store(3));
+    ASSERT_TRUE(camera.until([&] { return camera.count("SetPreset") == 2; }));
+    EXPECT_EQ(camera.calls("SetPreset")[1].after("PresetToken>"), "5");
+}
+
 TEST_F(SteeringCameraTest, ANumberThatIsAnothersTokenIsNotTakenFromOurOwnPreset) {
     ScriptedCamera camera;
     camera.setPreset("3", "Door");
