@@ -122,6 +122,12 @@ void Interface::loadSegues() {
             showPTZPanel();
         }
     });
+    // Connected before the controller's termination, which may take its time: no camera is left moving meanwhile.
+    connect(qApp, &QCoreApplication::aboutToQuit, this, [this] {
+        if (m_ptzPanel) {
+            m_ptzPanel->close();
+        }
+    });
 }
 
 /// One panel at a time: asked for again, it comes to the front.
@@ -129,7 +135,6 @@ void Interface::showPTZPanel() {
     if (ptzPanel() == nullptr) {
         m_ptzPanel = std::make_unique<PTZPanel>(m_window.get()).release(); // the window owns it
         connect(m_window.get(), &MainWindow::willClose, m_ptzPanel, &QWidget::close);
-        connect(qApp, &QCoreApplication::aboutToQuit, m_ptzPanel, &QWidget::close); // no camera is left moving
     }
     m_ptzPanel->present();
 }

@@ -482,10 +482,15 @@ TEST_F(PanelTest, ClosingTheWindowClosesThePanelWithoutACameraToo) {
 }
 
 TEST_F(PanelTest, TerminationClosesThePanel) {
+    bool wasOpen = true;
+    // Where the application connects the controller's termination.
+    QObject::connect(qApp, &QCoreApplication::aboutToQuit, &window(),
+                     [&] { wasOpen = interface->ptzPanel() != nullptr; });
     ASSERT_NO_FATAL_FAILURE(openPanel());
     QMetaObject::invokeMethod(qApp, &Interface::terminate, Qt::QueuedConnection);
     EXPECT_EQ(QCoreApplication::exec(), 0);
     EXPECT_EQ(interface->ptzPanel(), nullptr);
+    EXPECT_FALSE(wasOpen) << "a camera moves on while a recording ends";
     EXPECT_TRUE(window().isVisible()) << "the window goes with the interface";
 }
 
