@@ -271,7 +271,7 @@ TEST_F(PTZTest, TheFocusSliderGoesFromFarToNearAndTheAutomaticTakesItBack) {
     EXPECT_TRUE(shows([](const PositionCode& at) { return std::abs(at.focus - 0.5) < 0.01; }));
 }
 
-TEST_F(PTZTest, AnotherSourceChosenClosesThePanelAndStopsTheCamera) {
+TEST_F(PTZTest, TurningToTheMainWindowStopsTheCameraAndAnotherSourceClosesThePanel) {
     const auto publisher = publish("STUDIO", {"Cam 1", "Cam 2"}, {"--ptz"});
     ASSERT_NO_FATAL_FAILURE(steer(0, "STUDIO (Cam 1)"));
     Watcher watcher(addressOf(*publisher), "tcp");
@@ -280,7 +280,7 @@ TEST_F(PTZTest, AnotherSourceChosenClosesThePanelAndStopsTheCamera) {
     press(kPanLeft);
     ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + 500, last, track));
     EXPECT_GT(track.motions, 3) << "the camera does not move";
-    const std::int64_t chosen = now();
+    const std::int64_t turned = now();
     m_screen->activate(*window());
     ASSERT_TRUE(eventually([&] { return m_screen->isActive(*window()); }));
     choose(0, 1, "STUDIO (Cam 2)");
@@ -288,8 +288,8 @@ TEST_F(PTZTest, AnotherSourceChosenClosesThePanelAndStopsTheCamera) {
     ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + kStandsWithin.count(), last, track));
     m_screen->release();
     ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + kStandsWithin.count(), last, track));
-    EXPECT_GT(track.lastMotion, chosen - 200) << "it stood before";
-    EXPECT_LE(track.lastMotion, chosen + kStandsWithin.count()) << "in ms; the button was held until the end";
+    EXPECT_GT(track.lastMotion, turned - 200) << "it stood before";
+    EXPECT_LE(track.lastMotion, turned + kStandsWithin.count()) << "in ms; the button was held until the end";
     ASSERT_TRUE(picturesArrive(now()));
     EXPECT_TRUE(shows([](const PositionCode& at) { return distance(at, {}) <= kSamePlace; }));
 }

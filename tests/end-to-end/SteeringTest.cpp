@@ -6,8 +6,10 @@
 #include "tests/tools/Watcher.h"
 #include "tools/publish/PositionCode.h"
 
+#include <algorithm>
 #include <chrono>
 #include <cmath>
+#include <cstdint>
 #include <functional>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -93,6 +95,20 @@ class PublishedCamera : public testing::Test {
         m_publisher.emplace(arguments, 4);
     }
 
+    /// Waits until the camera is known by its name.
+    static bool isAnnounced() {
+        QIVOlib_find_instance_t const finder = QIVOlib_find_create_v2(nullptr);
+        const bool found = eventually([finder] {
+            std::uint32_t count = 0;
+            const QIVOlib_source_t* sources = QIVOlib_find_get_current_sources(finder, &count);
+            return std::any_of(sources, sources + count, [](const QIVOlib_source_t& source) {
+                return std::string(source.p_name) == "STUDIO (Cam 1)";
+            });
+        });
+        QIVOlib_find_destroy(finder);
+        return found;
+    }
+
     std::optional<PublishProcess> m_publisher;
     std::optional<Watcher> m_watcher;
     std::optional<PositionCode> m_last;
@@ -114,6 +130,7 @@ TEST_F(PublishedCamera, isSteeredWithTheLoginOfTheStreamsAddress) {
 
 TEST_F(PublishedCamera, isNotSteeredWithoutItsLogin) {
     publish({"--login", "ann:secret"});
+    ASSERT_TRUE(isAnnounced());
     QIVOlib_recv_create_v3_t settings{};
     settings.source.p_name = "STUDIO (Cam 1)";
     settings.color_format = QIVOlib_recv_color_format_rgba;
