@@ -6,6 +6,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <atomic>
 #include <csignal>
 #include <memory>
@@ -188,7 +189,11 @@ TEST_F(SteeringReceiverTest, ACameraIsAskedAnewAtEveryReturnOfItsSource) {
     EXPECT_TRUE(camera.until([&] {
         return receiver->steering()->zoom(0.5F) && camera.until([&] { return camera.speed().zoom == 0.5F; }, 200ms);
     }));
-    EXPECT_EQ(camera.calls("ContinuousMove").back().after("ProfileToken>"), "dome2");
+    // Not necessarily the last one: what steered before stops the camera beside it.
+    const auto moves = camera.calls("ContinuousMove");
+    EXPECT_TRUE(std::any_of(moves.begin(), moves.end(), [](const auto& move) {
+        return move.after("ProfileToken>") == "dome2" && move.body.find("Zoom") != std::string::npos;
+    }));
 }
 
 TEST_F(SteeringReceiverTest, SoundAloneIsNotSteered) {
