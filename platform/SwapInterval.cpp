@@ -13,9 +13,9 @@ Function resolve(const QOpenGLContext& context, const char* name) {
 
 #if QT_CONFIG(xcb_glx_plugin)
 void applyToGlx(const QOpenGLContext& context, int interval) {
-    using CurrentDisplay = struct _XDisplay* (*)();
+    using CurrentDisplay = void* (*)();
     using CurrentDrawable = unsigned long (*)();
-    using SwapIntervalExt = void (*)(struct _XDisplay*, unsigned long, int);
+    using SwapIntervalExt = void (*)(void*, unsigned long, int);
     const auto display = resolve<CurrentDisplay>(context, "glXGetCurrentDisplay");
     const auto drawable = resolve<CurrentDrawable>(context, "glXGetCurrentDrawable");
     const auto set = resolve<SwapIntervalExt>(context, "glXSwapIntervalEXT");

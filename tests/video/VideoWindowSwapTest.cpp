@@ -27,7 +27,7 @@ std::vector<Interval> takeIntervals() {
     return std::exchange(intervals, {});
 }
 
-void recordGlx(struct _XDisplay* /*display*/, unsigned long drawable, int interval) {
+void recordGlx(void* /*display*/, unsigned long drawable, int interval) {
     record(drawable, interval);
 }
 
