@@ -156,6 +156,14 @@ Window ViewerTest::view() const {
     return *child;
 }
 
+bool ViewerTest::sizeView(int width, int height) const {
+    const Window main = *window();
+    const Window inside = view();
+    m_screen->move(main, 0, 0);
+    m_screen->resize(main, width + main.width - inside.width, height + main.height - inside.height);
+    return eventually([&] { return view().width == width && view().height == height; });
+}
+
 Picture ViewerTest::viewPicture() const {
     return m_screen->grab(view());
 }

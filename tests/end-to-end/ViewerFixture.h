@@ -50,6 +50,8 @@ class ViewerTest : public testing::Test {
     std::optional<Window> window() const;
     /// The picture's own window inside the main window.
     Window view() const;
+    /// Sizes the main window so that its view has this size, in pixels.
+    bool sizeView(int width, int height) const;
     /// What the screen shows of the view.
     Picture viewPicture() const;
     /// The time drawn into the picture on the screen, in ms since the epoch, read from where the picture belongs.
