@@ -78,11 +78,13 @@ TEST_F(OnvifLibraryPeers, findsReadsMovesStopsAndRecalls) {
     EXPECT_EQ(continuousMove(0.5F, 0.25F, 0.1F, m_camera), 0) << m_camera->last_error;
     EXPECT_TRUE(shows(watcher, [](const PositionCode& at) { return at.pan > 0.05 && at.tilt > 0.02 && at.zoom > 0; }));
     EXPECT_EQ(moveStop(PAN_TILT_STOP, m_camera), 0) << m_camera->last_error;
-    const PositionCode turned = m_last;
-    EXPECT_TRUE(shows(watcher, [&](const PositionCode& at) { return at.zoom > turned.zoom + 0.01; }));
-    const double pan = m_last.pan;
-    EXPECT_TRUE(shows(watcher, [&](const PositionCode& at) { return at.zoom > turned.zoom + 0.03; }));
-    EXPECT_EQ(m_last.pan, pan) << "it turns on";
+    // Pictures of before the stop may still be on their way.
+    PositionCode stopped = m_last;
+    EXPECT_TRUE(shows(watcher, [&](const PositionCode& at) {
+        stopped = at.pan == stopped.pan && at.tilt == stopped.tilt ? stopped : at;
+        return at.zoom > stopped.zoom + 0.03;
+    })) << "it turns on, or zooms no more";
+    EXPECT_LT(stopped.pan, 1) << "it turned as far as it goes";
     EXPECT_EQ(moveStop(ZOOM_STOP, m_camera), 0) << m_camera->last_error;
     int pictures = 0;
     double zoom = -1;
