@@ -64,6 +64,10 @@ bool Connection::send(const std::string& bytes) {
     return true;
 }
 
+void Connection::keepNoMoreThan(int bytes) const {
+    setsockopt(m_socket, SOL_SOCKET, SO_SNDBUF, &bytes, sizeof(bytes));
+}
+
 void Connection::untilClosed() {
     while (!some().empty()) {
     }

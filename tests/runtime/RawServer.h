@@ -24,6 +24,8 @@ class Connection {
     std::string some();
     /// False if the other side has closed.
     bool send(const std::string& bytes);
+    /// The system keeps no more than about this much of what has been sent and not yet received.
+    void keepNoMoreThan(int bytes) const;
     /// Until the other side closes or the server ends.
     void untilClosed();
     /// Ends every operation above, from another thread.

@@ -85,7 +85,7 @@ void ReceiverFixture::SetUpTestSuite() {
 }
 
 ReceiverFixture::~ReceiverFixture() {
-    EXPECT_TRUE(runtime::BackgroundThreads::waitForAll(5s * kSanitizerPatience)) << "a receiver was not taken apart";
+    EXPECT_TRUE(runtime::BackgroundThreads::waitForAll(15s * kSanitizerPatience)) << "a receiver was not taken apart";
     EXPECT_EQ(m_view->listeners(), 0);
 }
 
