@@ -335,6 +335,66 @@ TEST_F(FragmenterTest, SoundThatHasStoppedGoesOnAsSilence) {
     EXPECT_EQ(next.sound.size(), (8000U + 80) * 3);
 }
 
+/// A recording as it goes on, by this machine's clock.
+class OngoingTest : public FragmenterTest {
+  protected:
+    /// Ten milliseconds; pictures come so much later than they belong.
+    void goOn(bool withSound, milliseconds picturesLate) {
+        m_now += milliseconds(10);
+        if (withSound) {
+            sound(m_now);
+        }
+        if ((m_now - picturesLate).count() % Nanoseconds(milliseconds(40)).count() == 0) {
+            picture(m_now - picturesLate, m_now);
+        }
+        const Fragment fragment = m_fragmenter.take(m_now);
+        m_cut = !fragment.pictures.empty() || !fragment.sound.empty();
+        if (!fragment.pictures.empty()) {
+            const MoviePicture& last = fragment.pictures.back();
+            m_pictureEnd = Nanoseconds((last.start + last.duration) * std::nano::den / movieTimescale);
+        }
+        if (!fragment.sound.empty()) {
+            const std::int64_t frames = fragment.soundStart + static_cast<std::int64_t>(fragment.sound.size()) / 3;
+            m_soundEnd = Nanoseconds(frames * std::nano::den / kFormat.rate);
+        }
+    }
+
+    Nanoseconds m_now = seconds(50);
+    Nanoseconds m_pictureEnd{}; ///< of what has been cut, as the next one
+    Nanoseconds m_soundEnd{};
+    bool m_cut = false; ///< just now
+};
+
+TEST_F(OngoingTest, PicturesAndSoundEndTogetherWhereverItIsBrokenOff) {
+    for (const milliseconds late : {milliseconds(0), milliseconds(60), milliseconds(350)}) {
+        m_fragmenter = {};
+        m_pictures = 0;
+        int cuts = 0;
+        for (int i = 0; i < 500; ++i) {
+            goOn(true, late);
+            if (m_cut && i > 100) {
+                ++cuts;
+                EXPECT_NEAR(ms(m_pictureEnd), ms(m_soundEnd), 1) << i << ", pictures late by " << late.count() << " ms";
+            }
+        }
+        EXPECT_GE(cuts, 8);
+    }
+}
+
+TEST_F(OngoingTest, NothingIsHeldForWhatDoesNotComeAnyMore) {
+    for (int i = 0; i < 200; ++i) {
+        goOn(true, milliseconds(0));
+    }
+    for (int i = 0; i < 300; ++i) {
+        goOn(false, milliseconds(0));
+        EXPECT_GE(ms(m_pictureEnd), ms(m_now - seconds(50)) - 800) << "pictures without sound";
+    }
+    for (int i = 0; i < 300; ++i) {
+        goOn(true, std::chrono::hours(1) + milliseconds(1));
+        EXPECT_TRUE(i < 100 || ms(m_soundEnd) >= ms(m_now - seconds(50)) - 800) << "sound without pictures";
+    }
+}
+
 TEST(ProgressLine, SaysTimePicturesDroppedBytesAndWhyItWaits) {
     Progress progress;
     progress.length = std::chrono::hours(26) + std::chrono::minutes(3) + seconds(4) + milliseconds(56);

@@ -1,7 +1,6 @@
 #include "tools/record/Fragmenter.h"
 
 #include <algorithm>
-#include <iterator>
 #include <utility>
 
 namespace qivo::record {
@@ -50,15 +49,14 @@ void Fragmenter::addPicture(CodedPicture picture, Nanoseconds now) {
     if (m_pictures.empty()) {
         placed.start = std::max(placed.start, m_pictureEnd);
     } else {
-        MoviePicture& last = m_pictures.back();
+        MoviePicture& last = m_pictures.back().picture;
         placed.start = std::max(placed.start, last.start + 1);
         last.duration = pictureDuration(placed.start - last.start);
         m_usualDuration = std::min(last.duration, longestUsual);
         placed.duration = m_usualDuration;
     }
     reach(time);
-    m_pictures.push_back(std::move(placed));
-    m_lastAdded = now;
+    m_pictures.push_back({std::move(placed), now});
     m_since = m_since.value_or(now);
 }
 
@@ -101,7 +99,7 @@ void Fragmenter::fillSound() {
     if (!m_placer || m_pictures.empty()) {
         return;
     }
-    const Nanoseconds reached(m_pictures.back().start * nanosecondsPerSecond / movieTimescale);
+    const Nanoseconds reached(m_pictures.back().picture.start * nanosecondsPerSecond / movieTimescale);
     const Nanoseconds heard(m_placer->next() * nanosecondsPerSecond / m_format.rate);
     if (!m_placer->begun() || reached - heard < soundLate) {
         return;
@@ -131,16 +129,32 @@ Fragment Fragmenter::take(Nanoseconds now) {
     }
     placeSoundAddedBefore(now - soundHeld);
     fillSound();
-    // How long the last picture lasts is known when the next one comes, unless that takes too long.
-    std::size_t pictures = m_pictures.empty() ? 0 : m_pictures.size() - 1;
-    if (!m_pictures.empty() && now - m_lastAdded >= fragmentLength) {
-        // Less than usual, so that the next one begins where it belongs also if it is only late in coming here.
-        m_pictures.back().duration = std::max<std::uint32_t>(m_usualDuration / 2, 1);
-        pictures = m_pictures.size();
-    }
-    Fragment fragment = cut(pictures);
-    m_since = m_pictures.empty() && m_held.empty() ? std::nullopt : std::optional(now);
+    Fragment fragment = cut(picturesThatCanGo(now));
+    m_since = m_pictures.empty() && m_held.empty() && m_sound.empty() ? std::nullopt : std::optional(now);
     return fragment;
+}
+
+/// How many of the pictures that are held. Without the sound that belongs to them they would outlast it where the movie
+/// is broken off.
+std::size_t Fragmenter::picturesThatCanGo(Nanoseconds now) {
+    if (m_pictures.empty()) {
+        return 0;
+    }
+    // How long the last picture lasts is known when the next one comes, unless that takes too long.
+    if (HeldPicture& last = m_pictures.back(); now - last.added >= fragmentLength) {
+        // Less than usual, so that the next one begins where it belongs also if it is only late in coming here.
+        last.picture.duration = std::max<std::uint32_t>(m_usualDuration / 2, 1);
+        return m_pictures.size();
+    }
+    std::size_t count = m_pictures.size() - 1;
+    if (m_placer && m_placer->begun()) {
+        const std::int64_t heard = m_placer->next() * movieTimescale / m_format.rate;
+        while (count > 0 && m_pictures[count].picture.start > heard &&
+               now - m_pictures[count - 1].added < pictureHeld) {
+            --count;
+        }
+    }
+    return count;
 }
 
 Fragment Fragmenter::takeAll() {
@@ -156,14 +170,32 @@ Fragment Fragmenter::takeAll() {
 Fragment Fragmenter::cut(std::size_t pictures) {
     Fragment fragment;
     const auto end = m_pictures.begin() + static_cast<std::ptrdiff_t>(pictures);
-    fragment.pictures.assign(std::make_move_iterator(m_pictures.begin()), std::make_move_iterator(end));
+    for (auto held = m_pictures.begin(); held != end; ++held) {
+        fragment.pictures.push_back(std::move(held->picture));
+    }
     m_pictures.erase(m_pictures.begin(), end);
     if (!fragment.pictures.empty()) {
         m_pictureEnd = fragment.pictures.back().start + fragment.pictures.back().duration;
     }
     fragment.soundStart = m_soundStart;
-    fragment.sound = std::exchange(m_sound, {});
+    fragment.sound = cutSound();
     return fragment;
+}
+
+/// What is heard with a picture that is still held waits for it.
+std::vector<std::uint8_t> Fragmenter::cutSound() {
+    if (m_pictures.empty() || m_sound.empty()) {
+        return std::exchange(m_sound, {});
+    }
+    const auto frameBytes = static_cast<std::int64_t>(bytesPerSoundFrame(m_format));
+    const std::int64_t end = m_pictures.front().picture.start * m_format.rate / movieTimescale;
+    const std::int64_t frames =
+        std::clamp<std::int64_t>(end - m_soundStart, 0, static_cast<std::int64_t>(m_sound.size()) / frameBytes);
+    const auto split = m_sound.begin() + static_cast<std::ptrdiff_t>(frames * frameBytes);
+    std::vector<std::uint8_t> sound(m_sound.begin(), split);
+    m_sound.erase(m_sound.begin(), split);
+    m_soundStart += frames;
+    return sound;
 }
 
 } // namespace qivo::record

@@ -26,7 +26,8 @@ struct SoundPiece {
 /** Puts pictures and sound on the movie's time line and cuts it into fragments.
  *
  *  The movie begins with the first picture, and without one soon enough with the first sound. A picture lasts until the
- *  next one. Time is given by the caller. */
+ *  next one. While both come, pictures and sound of a fragment end together, so that they do so wherever the movie is
+ *  broken off. Time is given by the caller. */
 class Fragmenter {
   public:
     /** How much is collected before it is written. What is not written is lost to a power cut, so well below a second.
@@ -36,6 +37,8 @@ class Fragmenter {
     static constexpr Nanoseconds pictureAwaited = std::chrono::milliseconds(500);
     /** How long sound waits for better knowledge of where it belongs. */
     static constexpr Nanoseconds soundHeld = std::chrono::milliseconds(200);
+    /** How long pictures wait for the sound that belongs to them. */
+    static constexpr Nanoseconds pictureHeld = std::chrono::milliseconds(300);
     /** Sound that is behind the pictures by so much is filled up with silence, and how far. */
     static constexpr Nanoseconds soundLate = std::chrono::milliseconds(1500);
     static constexpr Nanoseconds soundAwaited = std::chrono::milliseconds(1000);
@@ -57,6 +60,10 @@ class Fragmenter {
     [[nodiscard]] Nanoseconds length() const { return m_length; }
 
   private:
+    struct HeldPicture {
+        MoviePicture picture;
+        Nanoseconds added{};
+    };
     struct HeldSound {
         SoundPiece piece;
         Nanoseconds added{};
@@ -66,18 +73,19 @@ class Fragmenter {
     void placeSoundAddedBefore(Nanoseconds time);
     void placeSound(const SoundPiece& piece);
     void fillSound();
+    [[nodiscard]] std::size_t picturesThatCanGo(Nanoseconds now);
     [[nodiscard]] Fragment cut(std::size_t pictures);
+    [[nodiscard]] std::vector<std::uint8_t> cutSound();
     void reach(Nanoseconds time);
 
     std::optional<Nanoseconds> m_origin;
     std::deque<HeldSound> m_held; ///< sound that has not been placed
     SoundFormat m_format;
     std::optional<SoundPlacer> m_placer;
-    std::vector<MoviePicture> m_pictures;
-    std::vector<std::uint8_t> m_sound;
+    std::vector<HeldPicture> m_pictures;
+    std::vector<std::uint8_t> m_sound; ///< that has been placed
     std::int64_t m_soundStart = 0;
     std::optional<Nanoseconds> m_since; ///< when the oldest of what waits was added
-    Nanoseconds m_lastAdded{};          ///< when the newest picture was
     std::int64_t m_pictureEnd = 0;      ///< of what has been cut
     std::uint32_t m_usualDuration = movieTimescale / 30;
     Nanoseconds m_length{};
