@@ -209,7 +209,6 @@ ReceiverLoop::Outcome ReceiverLoop::watch(const RtspSession& session, const std:
             if (playing - began < kStepLimit && *lastPacket - playing < kTcpLimit) {
                 m_patience = 0;
             }
-            m_mailbox->raiseStatus();
             steer(std::exchange(m_shown, true));
         }
         if (auto outcome = judge(session, began, url, tcp)) {

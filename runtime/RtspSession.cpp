@@ -371,8 +371,13 @@ void RtspSession::progress(GstMessage* message) {
     }
 }
 
+/// The first tells the caller that the source is connected: here and not by whoever watches the session, for whom its
+/// first picture may be faster.
 void RtspSession::packetArrived() {
     if (m_lastPacket.exchange(nowTicks()) == 0) {
+        if (!m_muted) {
+            m_mailbox->raiseStatus();
+        }
         m_wakeup->notify();
     }
 }

@@ -28,8 +28,9 @@ enum class Media { video, audio };
 /// One connection to an RTSP server, from the first packet sent to the last received. It is not repaired: when it ends,
 /// the next one is made from scratch.
 ///
-/// Pictures and sound go to the mailbox from threads of the session. Thread: constructed, asked and destroyed on one
-/// thread, which may be blocked for as long as a step of the handshake takes to cancel.
+/// Pictures and sound go to the mailbox from threads of the session, and before them a status change. Thread:
+/// constructed, asked and destroyed on one thread, which may be blocked for as long as a step of the handshake takes to
+/// cancel.
 class RtspSession {
   public:
     using Clock = std::chrono::steady_clock;
