@@ -135,13 +135,22 @@ class ReceiverSound : public ReceiverFixture {
         }
     }
 
-    /// So many seconds; less if the source stops before.
+    /// So many seconds; less if the source stops before. Begun anew, a few times, where a busy machine kept the
+    /// listener away for so long that what waits for him may not all be held.
     Recording record(Receiver& receiver, double seconds, double skipped = 0.0) {
         Recording begin;
         while (begin.seconds() < skipped && hear(receiver, begin, 8s)) {
         }
+        constexpr auto longestAbsence = runtime::SoundQueue::kHeld * 4 / 5;
         Recording recording;
-        while (recording.seconds() < seconds && hear(receiver, recording, 8s)) {
+        bool absent = true;
+        for (int attempts = 5; absent && attempts > 0; --attempts) {
+            recording = {};
+            absent = false;
+            for (auto last = Clock::now(); recording.seconds() < seconds && hear(receiver, recording, 8s);) {
+                absent = absent || Clock::now() - last > longestAbsence;
+                last = Clock::now();
+            }
         }
         return recording;
     }
