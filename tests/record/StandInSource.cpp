@@ -165,13 +165,13 @@ Receiver* receiverOf(QIVOlib_recv_instance_t handle) {
     return reinterpret_cast<Receiver*>(handle);
 }
 
-std::int64_t arrival() {
-    return std::chrono::duration_cast<std::chrono::nanoseconds>(std::chrono::system_clock::now().time_since_epoch())
-               .count() /
-           100;
+/// By the script, not by when a busy machine came to run this.
+std::int64_t arrival(Clock::time_point arrived) {
+    const std::chrono::nanoseconds now = std::chrono::system_clock::now().time_since_epoch();
+    return (now - (Clock::now() - arrived)).count() / 100;
 }
 
-int32_t giveSound(Receiver& receiver, QIVOlib_audio_frame_v2_t& frame, std::int64_t number) {
+int32_t giveSound(Receiver& receiver, QIVOlib_audio_frame_v2_t& frame, std::int64_t number, Clock::time_point arrived) {
     const Script& script = receiver.script;
     const long ms = receiver.msOf(number);
     const int rate = script.rateAt >= 0 && ms >= script.rateAt ? script.changedRate : script.soundRate;
@@ -182,11 +182,12 @@ int32_t giveSound(Receiver& receiver, QIVOlib_audio_frame_v2_t& frame, std::int6
     frame.timecode = receiver.stampOf(number);
     frame.p_data = receiver.samples.data();
     frame.channel_stride_in_bytes = frame.no_samples * static_cast<int32_t>(sizeof(float));
-    frame.timestamp = arrival();
+    frame.timestamp = arrival(arrived);
     return QIVOlib_frame_type_audio;
 }
 
-int32_t givePicture(Receiver& receiver, QIVOlib_video_frame_v2_t& frame, std::int64_t number, Clock::time_point due) {
+int32_t givePicture(Receiver& receiver, QIVOlib_video_frame_v2_t& frame, std::int64_t number, Clock::time_point due,
+                    Clock::time_point arrived) {
     const Script& script = receiver.script;
     const long ms = receiver.msOf(number);
     const bool resized = script.resizeAt >= 0 && ms >= script.resizeAt;
@@ -204,7 +205,7 @@ int32_t givePicture(Receiver& receiver, QIVOlib_video_frame_v2_t& frame, std::in
     frame.timecode = receiver.stampOf(number);
     frame.p_data = receiver.pixels.data();
     frame.line_stride_in_bytes = 4 * frame.xres;
-    frame.timestamp = arrival();
+    frame.timestamp = arrival(arrived);
     return QIVOlib_frame_type_video;
 }
 
@@ -249,7 +250,8 @@ int32_t QIVOlib_recv_capture_v2(QIVOlib_recv_instance_t handle, QIVOlib_video_fr
         std::this_thread::sleep_until(due + late);
         const std::int64_t number = receiver.number++;
         if (receiver.comes(receiver.msOf(number))) {
-            return receiver.sound ? giveSound(receiver, *audio, number) : givePicture(receiver, *video, number, due);
+            return receiver.sound ? giveSound(receiver, *audio, number, due + late)
+                                  : givePicture(receiver, *video, number, due, due + late);
         }
     }
     std::this_thread::sleep_until(limit);
