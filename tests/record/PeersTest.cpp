@@ -10,6 +10,7 @@
 #include <gtest/gtest.h>
 #include <iterator>
 #include <sstream>
+#include <vector>
 
 namespace qivo::test {
 namespace {
@@ -139,11 +140,15 @@ TEST(RecorderPeersOnTheNetwork, PictureAndSoundOfASourceOnTheNetworkAreTogether)
                                            "Cam 1", "--size", "320x180", "--input", clip});
     ASSERT_TRUE(publisher && publisher->waitForOutput("(Cam 1)"));
     RecorderProcess recorder("", "STUDIO (Cam 1)", "exec \"$@\"", "");
-    ASSERT_TRUE(recorder.waitForLength(milliseconds(3500))) << recorder.process().errors();
+    ASSERT_TRUE(recorder.waitForLength(milliseconds(4500))) << recorder.process().errors();
     EXPECT_EQ(recorder.interrupt(), 0);
     const DecodedMovie movie = recorder.movie();
     ASSERT_TRUE(movie.readable) << movie.error;
-    const auto seen = flashes(movie);
+    // The sender reports its clock within a second. Before that the two are together as they arrive, and pictures are
+    // decoded, which takes a busy machine longer.
+    constexpr double reported = 1.5;
+    auto seen = flashes(movie);
+    std::erase_if(seen, [](double flash) { return flash < reported; });
     const auto heard = tones(movie);
     ASSERT_GE(seen.size(), 2U);
     for (const double flash : seen) {

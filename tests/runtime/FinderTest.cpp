@@ -34,7 +34,7 @@ class FinderTest : public testing::Test {
         ASSERT_NE(m_first, nullptr);
         const auto end = std::chrono::steady_clock::now() + kDeadline;
         while (m_responder.questions(kPtr) == 0 && std::chrono::steady_clock::now() < end) {
-            std::this_thread::yield();
+            std::this_thread::sleep_for(1ms);
         }
     }
 
