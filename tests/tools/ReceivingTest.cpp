@@ -3,13 +3,17 @@
 #include "tests/runtime/Patience.h"
 #include "tests/tools/Publisher.h"
 
+#include "sdk/Timecode.h"
 #include "sdk/qivo.h"
+#include "tools/publish/TimeCode.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <csignal>
 #include <cstdlib>
+#include <vector>
 
 namespace qivo::test {
 namespace {
@@ -86,6 +90,30 @@ TEST_F(Receiving, SourceIsBackWithinTwoSecondsOfItsReturnAlsoAtAnotherAddress) {
         EXPECT_LT(took, 2s * kSanitizerPatience) << port;
         RecordProperty("back_ms_" + std::string(port), static_cast<int>(took.count()));
     }
+}
+
+TEST_F(Receiving, TimecodeIsWhatStandsInThePicture) {
+    const auto publisher = publish("640x360", "8801");
+    ASSERT_TRUE(pictureComes(640, 10s));
+    EXPECT_FALSE(pictureComes(1, 2s)) << "time for the first reports of the clock";
+    std::vector<double> differences; // from what stands in the picture, in milliseconds
+    for (const auto deadline = Clock::now() + 20s; differences.size() < 15 && Clock::now() < deadline;) {
+        QIVOlib_video_frame_v2_t frame{};
+        if (QIVOlib_recv_capture_v2(m_receiver, &frame, nullptr, nullptr, 20) != QIVOlib_frame_type_video) {
+            continue;
+        }
+        constexpr int bytesAPixel = 4;
+        const auto published =
+            readTimeCode(frame.p_data, frame.xres, frame.yres, frame.line_stride_in_bytes, bytesAPixel);
+        if (published && frame.timecode >= firstWallTimecode) {
+            differences.push_back(static_cast<double>(frame.timecode) * 1e-4 - static_cast<double>(*published));
+        }
+        QIVOlib_recv_free_video_v2(m_receiver, &frame);
+    }
+    ASSERT_EQ(differences.size(), 15U) << publisher->errors();
+    std::sort(differences.begin(), differences.end());
+    RecordProperty("difference_us", static_cast<int>(differences[7] * 1000));
+    EXPECT_NEAR(differences[7], 0, 5);
 }
 
 /// The publisher on another machine, at the other end of a cable.

@@ -1,12 +1,15 @@
 #include "tools/publish/TestPicture.h"
 #include "tests/tools/Canvas.h"
 
+#include "tools/publish/PictureSource.h"
 #include "tools/publish/TimeCode.h"
 
 #include <gtest/gtest.h>
 
+#include <chrono>
 #include <cstdlib>
 #include <numeric>
+#include <thread>
 
 namespace qivo {
 namespace {
@@ -126,6 +129,22 @@ TEST(TestPicture, clockTextIsTheLocalTimeOfDay) {
     EXPECT_EQ(clockText(0ms), "02:00:00.000");
     unsetenv("TZ");
     tzset();
+}
+
+TEST(DrawnPictures, showWhenTheyWereDueHoweverLateTheyArePainted) {
+    gst_init(nullptr, nullptr);
+    PictureFormat format;
+    format.size = {64, 36};
+    format.rate = {1, 1};
+    Moment shown;
+    DrawnPictureSource source(format, [&shown](const PicturePlanes&, Moment time) { shown = time; });
+    std::this_thread::sleep_for(500ms); // into the middle of an interval
+    const Picture picture = source.next();
+    using Milliseconds = std::chrono::duration<double, std::milli>;
+    const Milliseconds age = std::chrono::steady_clock::now() - picture.taken;
+    const Milliseconds shownAge = std::chrono::system_clock::now() - shown;
+    EXPECT_GE(age.count(), 400);
+    EXPECT_NEAR(shownAge.count(), age.count(), 20);
 }
 
 } // namespace

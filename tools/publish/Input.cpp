@@ -209,7 +209,7 @@ class InputPictureSource final : public PictureSource {
         if (!m_substitute) {
             m_substitute = std::make_unique<PicturePainter>(m_slot.format, drawTestPicture(m_slot.format, m_look));
         }
-        return {m_substitute->paint(), due};
+        return {m_substitute->paint(due), due};
     }
 
     void stop() override {

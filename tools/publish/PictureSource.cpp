@@ -44,7 +44,7 @@ PicturePainter::~PicturePainter() {
     gst_buffer_pool_set_active(m_pool.get(), FALSE);
 }
 
-Buffer PicturePainter::paint() {
+Buffer PicturePainter::paint(std::chrono::steady_clock::time_point moment) {
     GstBuffer* buffer = nullptr;
     if (gst_buffer_pool_acquire_buffer(m_pool.get(), &buffer, nullptr) != GST_FLOW_OK) {
         return nullptr;
@@ -54,7 +54,8 @@ Buffer PicturePainter::paint() {
     if (gst_video_frame_map(&frame, &m_info, buffer, GST_MAP_WRITE) == FALSE) {
         return nullptr;
     }
-    m_draw(planesOf(frame), std::chrono::system_clock::now());
+    const auto age = std::chrono::steady_clock::now() - moment;
+    m_draw(planesOf(frame), std::chrono::system_clock::now() - age);
     gst_video_frame_unmap(&frame);
     return owned;
 }
@@ -70,7 +71,7 @@ Picture DrawnPictureSource::next() {
             return {};
         }
     }
-    return {m_painter.paint(), due};
+    return {m_painter.paint(due), due};
 }
 
 void DrawnPictureSource::stop() {

@@ -56,8 +56,9 @@ class PicturePainter {
     PicturePainter(const PicturePainter&) = delete;
     PicturePainter& operator=(const PicturePainter&) = delete;
 
-    /** The picture of this moment; null if there is no memory. */
-    [[nodiscard]] Buffer paint();
+    /** The picture of a moment, whose wall clock is what it shows, however late it is painted; null if there is no
+     *  memory. */
+    [[nodiscard]] Buffer paint(std::chrono::steady_clock::time_point moment);
 
   private:
     DrawPicture m_draw;
