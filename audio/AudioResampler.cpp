@@ -1,7 +1,8 @@
 #include "audio/AudioResampler.h"
 
-#include "audio/ResamplerBlocks.h"
+#include "audio/ResamplerSpline.h"
 
+#include <algorithm>
 #include <cfloat>
 #include <climits>
 #include <cmath>
@@ -17,7 +18,7 @@ namespace qivo {
 
 namespace {
 
-constexpr int kHistory = 4;
+constexpr std::ptrdiff_t kHistory = 4;
 
 /// Up to this far from a whole sample, a call at nearly equal rates copies.
 constexpr float kPassThroughDrift = 0.01F;
@@ -29,14 +30,6 @@ int slotsLeft(const SampleCursor& cursor, int stride) {
 bool overlap(const SampleCursor& one, const SampleCursor& other) {
     const std::less<const float*> before;
     return before(one.position, other.end) && before(other.position, one.end);
-}
-
-/// The spline from x1 (t = 0) to x2 (t = 1).
-float spline(float x0, float x1, float x2, float x3, float t) {
-    const float a = ((x1 - x2) * 3.0F - x0 + x3) * 0.5F;
-    const float b = (x2 + x2 + x0) - (x1 * 5.0F + x3) * 0.5F;
-    const float c = (x2 - x0) * 0.5F;
-    return ((a * t + b) * t + c) * t + x1;
 }
 
 } // namespace
@@ -76,27 +69,32 @@ int AudioResampler::processSrc(SampleCursor* src, SampleCursor* toDst, int withS
     if (src->position == nullptr) {
         return processDst(toDst, andWithDstStride);
     }
-    if (src->position >= src->end) {
+    return process(*src, *toDst, withSrcStride, andWithDstStride, widestResamplerLanes());
+}
+
+int AudioResampler::process(SampleCursor& src, SampleCursor& dst, int srcStride, int dstStride,
+                            ResamplerLanes lanes) noexcept {
+    if (src.position >= src.end) {
         return 0;
     }
-    if (toDst->position >= toDst->end) {
+    if (dst.position >= dst.end) {
         return 1;
     }
-    const int inSrc = slotsLeft(*src, withSrcStride);
-    const int inDst = slotsLeft(*toDst, andWithDstStride);
+    const int inSrc = slotsLeft(src, srcStride);
+    const int inDst = slotsLeft(dst, dstStride);
     const int n = inSrc < inDst ? inSrc : inDst;
     const float endPosn = (-1.0F + m_output_delta) * static_cast<float>(n) + m_output_posn;
     if (m_sample_index == -1) {
         for (float& sample : m_last_samples) {
-            sample = *src->position;
+            sample = *src.position;
         }
         m_sample_index = 0;
     }
     if (endPosn <= kPassThroughDrift && std::fabs(m_output_posn) < kPassThroughDrift && endPosn >= 0.0F) {
         m_output_posn = endPosn;
-        return copy(*src, *toDst, n, withSrcStride, andWithDstStride);
+        return copy(src, dst, n, srcStride, dstStride);
     }
-    return interpolate(*src, *toDst, withSrcStride, andWithDstStride);
+    return interpolate(src, dst, srcStride, dstStride, lanes);
 }
 
 /// The history stays as it is: a spline that follows goes on from before the copy.
@@ -124,20 +122,21 @@ int AudioResampler::copy(SampleCursor& src, SampleCursor& dst, int n, std::ptrdi
     return src.position < src.end ? 1 : 0;
 }
 
-int AudioResampler::interpolate(SampleCursor& src, SampleCursor& dst, int srcStride, int dstStride) noexcept {
-    // Blocks read their history from the source itself, so they begin when four of its samples have been taken.
+int AudioResampler::interpolate(SampleCursor& src, SampleCursor& dst, int srcStride, int dstStride,
+                                ResamplerLanes lanes) noexcept {
     bool blocksAhead = srcStride == 1 && !overlap(src, dst);
-    const float* const begin = src.position;
     while (true) {
-        if (blocksAhead && src.position - begin >= kHistory) {
+        if (!catchUp(src, srcStride)) {
+            return 0;
+        }
+        // Positions are negative for some outputs at most, and only where the ratio or the position was set so.
+        if (blocksAhead && m_output_posn >= 0.0F) {
             blocksAhead = false;
-            interpolateBlocks(src, dst, dstStride);
+            interpolateBlocks(src, dst, dstStride, lanes);
             if (dst.position >= dst.end) {
                 return 1;
             }
-        }
-        if (!catchUp(src, srcStride)) {
-            return 0;
+            continue;
         }
         const auto k = static_cast<std::uint32_t>(m_sample_index);
         const float t = m_output_posn;
@@ -170,17 +169,27 @@ void AudioResampler::take(float sample) noexcept {
     m_sample_index = static_cast<std::int32_t>(index + 1);
 }
 
-void AudioResampler::interpolateBlocks(SampleCursor& src, SampleCursor& dst, int dstStride) noexcept {
-    const std::ptrdiff_t slots = (dst.end - dst.position + dstStride - 1) / dstStride;
-    ResamplerRun run = {src.position, src.end - src.position, dst.position, slots,
-                        dstStride,    m_output_posn,          m_scaling,    m_output_delta};
-    resampleBlocks(run);
-    const auto taken = static_cast<std::uint32_t>(run.src - src.position);
-    if (taken > 0) {
-        m_sample_index = static_cast<std::int32_t>(static_cast<std::uint32_t>(m_sample_index) + taken - kHistory);
-        for (int i = -kHistory; i < 0; ++i) {
-            take(run.src[i]);
-        }
+void AudioResampler::interpolateBlocks(SampleCursor& src, SampleCursor& dst, int dstStride,
+                                       ResamplerLanes lanes) noexcept {
+    ResamplerRun run = {};
+    for (std::uint32_t i = 0; i < kHistory; ++i) {
+        run.history[i] = m_last_samples[(static_cast<std::uint32_t>(m_sample_index) + i) & 3];
+    }
+    run.src = src.position;
+    run.srcLeft = src.end - src.position;
+    run.dst = dst.position;
+    run.dstSlots = (dst.end - dst.position + dstStride - 1) / dstStride;
+    run.dstStride = dstStride;
+    run.position = m_output_posn;
+    run.scaling = m_scaling;
+    run.delta = m_output_delta;
+    resampleBlocks(run, lanes);
+    const std::ptrdiff_t taken = run.src - src.position;
+    const std::ptrdiff_t keeping = std::min(taken, kHistory);
+    m_sample_index = static_cast<std::int32_t>(static_cast<std::uint32_t>(m_sample_index) +
+                                               static_cast<std::uint32_t>(taken - keeping));
+    for (std::ptrdiff_t i = -keeping; i < 0; ++i) {
+        take(run.src[i]);
     }
     src.position += taken;
     dst.position = run.dst;

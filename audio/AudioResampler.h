@@ -1,5 +1,6 @@
 #pragma once
 
+#include "audio/ResamplerBlocks.h"
 #include "audio/SampleCursor.h"
 
 #include <cstddef>
@@ -46,13 +47,14 @@ class AudioResampler {
     int processSrc(SampleCursor* src, SampleCursor* toDst, int withSrcStride, int andWithDstStride) noexcept;
 
   private:
-    friend class AudioResamplerState; // tests read and set the state through it
+    friend class AudioResamplerState; // tests read and set the state through it, and choose the lanes
 
+    int process(SampleCursor& src, SampleCursor& dst, int srcStride, int dstStride, ResamplerLanes lanes) noexcept;
     int copy(SampleCursor& src, SampleCursor& dst, int n, std::ptrdiff_t srcStride,
              std::ptrdiff_t dstStride) const noexcept;
-    int interpolate(SampleCursor& src, SampleCursor& dst, int srcStride, int dstStride) noexcept;
+    int interpolate(SampleCursor& src, SampleCursor& dst, int srcStride, int dstStride, ResamplerLanes lanes) noexcept;
     bool catchUp(SampleCursor& src, int srcStride) noexcept;
-    void interpolateBlocks(SampleCursor& src, SampleCursor& dst, int dstStride) noexcept;
+    void interpolateBlocks(SampleCursor& src, SampleCursor& dst, int dstStride, ResamplerLanes lanes) noexcept;
     void take(float sample) noexcept;
 
     /// Source samples taken into the history since the last reset; -1 before the first. The low two bits name the slot
