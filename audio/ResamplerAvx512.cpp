@@ -130,10 +130,26 @@ QIVO_INLINE_AVX512 History wide(const float* first, __m512i offset) {
     return {fromTwo(first, offset), fromTwo(first + 1, offset), fromTwo(first + 2, offset), fromTwo(first + 3, offset)};
 }
 
+/// The samples of four outputs, four apart in `taken`.
+QIVO_INLINE_AVX512 __m512 four(const float* base, const std::int32_t* taken) {
+    __m512 all = _mm512_castps128_ps512(_mm_loadu_ps(base + taken[0]));
+    all = _mm512_insertf32x4(all, _mm_loadu_ps(base + taken[4]), 1);
+    all = _mm512_insertf32x4(all, _mm_loadu_ps(base + taken[8]), 2);
+    return _mm512_insertf32x4(all, _mm_loadu_ps(base + taken[12]), 3);
+}
+
 /// The same anywhere.
-QIVO_INLINE_AVX512 History apart(const float* base, __m512i taken) {
-    return {_mm512_i32gather_ps(taken, base, 4), _mm512_i32gather_ps(taken, base + 1, 4),
-            _mm512_i32gather_ps(taken, base + 2, 4), _mm512_i32gather_ps(taken, base + 3, 4)};
+QIVO_INLINE_AVX512 History apart(const float* base, const std::int32_t* taken) {
+    const __m512 r0 = four(base, taken);
+    const __m512 r1 = four(base, taken + 1);
+    const __m512 r2 = four(base, taken + 2);
+    const __m512 r3 = four(base, taken + 3);
+    const __m512 low01 = _mm512_unpacklo_ps(r0, r1);
+    const __m512 high01 = _mm512_unpackhi_ps(r0, r1);
+    const __m512 low23 = _mm512_unpacklo_ps(r2, r3);
+    const __m512 high23 = _mm512_unpackhi_ps(r2, r3);
+    return {_mm512_shuffle_ps(low01, low23, 0x44), _mm512_shuffle_ps(low01, low23, 0xEE),
+            _mm512_shuffle_ps(high01, high23, 0x44), _mm512_shuffle_ps(high01, high23, 0xEE)};
 }
 
 /// The spline in the resampler's own grouping.
@@ -148,6 +164,13 @@ QIVO_INLINE_AVX512 __m512 splines(const History& x, __m512 t, __m512 scaling) {
     return _mm512_mul_ps(_mm512_add_ps(_mm512_mul_ps(cubic, t), x.x1), scaling);
 }
 
+QIVO_INLINE_AVX512 void storeFour(__m128 out, float* dst, std::ptrdiff_t stride) {
+    _mm_store_ss(dst, out);
+    _mm_store_ss(dst + stride, _mm_shuffle_ps(out, out, 1));
+    _mm_store_ss(dst + 2 * stride, _mm_shuffle_ps(out, out, 2));
+    _mm_store_ss(dst + 3 * stride, _mm_shuffle_ps(out, out, 3));
+}
+
 /// Only the first `count` slots are written: what lies between and behind them belongs to others.
 QIVO_INLINE_AVX512 void store(__m512 out, float* dst, std::ptrdiff_t stride, int count) {
     if (stride == 1) {
@@ -160,6 +183,11 @@ QIVO_INLINE_AVX512 void store(__m512 out, float* dst, std::ptrdiff_t stride, int
         if (count > kLanes / 2) {
             _mm512_mask_storeu_ps(dst + kLanes, static_cast<__mmask16>(slots >> 16), _mm512_permutexvar_ps(upper, out));
         }
+    } else if (count == kLanes) {
+        storeFour(_mm512_castps512_ps128(out), dst, stride);
+        storeFour(_mm512_extractf32x4_ps(out, 1), dst + 4 * stride, stride);
+        storeFour(_mm512_extractf32x4_ps(out, 2), dst + 8 * stride, stride);
+        storeFour(_mm512_extractf32x4_ps(out, 3), dst + 12 * stride, stride);
     } else {
         alignas(64) std::array<float, kLanes> each;
         _mm512_store_ps(each.data(), out);
@@ -176,7 +204,7 @@ QIVO_INLINE_AVX512 __m512 sixteen(const ResamplerRun& run, const Positions& posi
     const __m512 t = _mm512_loadu_ps(positions.t.data() + at);
     const std::int32_t span = taken[kLanes - 1] - taken[0];
     if (span >= 2 * kLanes) {
-        return splines(apart(oldest, all), t, scaling);
+        return splines(apart(oldest, taken), t, scaling);
     }
     // Near the end of the source the loads begin before the first output's samples, so as to stay within.
     const bool isNear = span < kLanes;
