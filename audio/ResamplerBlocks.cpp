@@ -95,7 +95,7 @@ void followChain(const Step& step, Positions& positions, int count) {
     }
 }
 
-/// Not so the two zeros.
+/// The two zeros differ.
 bool sameBits(float one, float other) {
     return std::bit_cast<std::uint32_t>(one) == std::bit_cast<std::uint32_t>(other);
 }

@@ -72,7 +72,7 @@ extern const std::array<DriftTable, 2> kDrift;
 struct Step {
     float delta;
     float whole;          ///< its integer part: a step takes that many samples or one more
-    bool isWhole;         ///< delta is an integer: the samples taken for an output are as many as for any other
+    bool isWhole;         ///< delta is an integer: most often no position differs from the first
     bool onGrid;          ///< positions are multiples of `unit` and can be guessed
     float unit;           ///< g
     float perUnit;        ///< 1 / g
@@ -89,13 +89,14 @@ struct Positions {
 
 /// What an instruction set does.
 struct Kernel {
-    /// Finds the block's positions from the first, for a step that is on the grid. Returns false, with anything but the
-    /// first in `positions`, where they are not what steps in single precision lead to.
+    /// Finds the block's positions from the first, for a step that is on the grid. Returns false, with anything in
+    /// `positions`, where they are not what steps in single precision lead to.
     bool (*guess)(const Step& step, Positions& positions, int count);
     /// Does the same where every output's position is the first one's.
     void (*repeat)(const Step& step, Positions& positions, int count);
-    /// Makes outputs [from, count) of a block into run.dst. The last one's samples lie within the source, those of all
-    /// at or after run.src - 4, and this in it. The first kMost entries of `taken` beyond repeat the last.
+    /// Makes outputs [from, count) of a block; the block's first one belongs into run.dst. All their samples lie within
+    /// the source, which has kShortest or more. The kMost entries of `taken` behind the last output's repeat it, so
+    /// that the lanes without an output read what one with an output reads.
     void (*interpolate)(const ResamplerRun& run, const Positions& positions, int from, int count);
 };
 
