@@ -1,5 +1,7 @@
 #include "tests/runtime/ScriptedCamera.h"
 
+#include <gtest/gtest.h>
+
 #include <algorithm>
 #include <cstdlib>
 #include <ctime>
@@ -288,6 +290,20 @@ std::vector<CameraCall> ScriptedCamera::calls(const std::string& operation) cons
     std::copy_if(m_calls.begin(), m_calls.end(), std::back_inserter(found),
                  [&](const CameraCall& call) { return operation.empty() || call.operation == operation; });
     return found;
+}
+
+CameraCall ScriptedCamera::call(const std::string& operation, std::size_t number) const {
+    std::vector<CameraCall> found;
+    until([&] { return (found = calls(operation)).size() > number; });
+    if (found.size() <= number) {
+        ADD_FAILURE() << operation << " was asked " << found.size() << " times";
+        return {};
+    }
+    return found[number];
+}
+
+CameraCall ScriptedCamera::lastCall(const std::string& operation) const {
+    return call(operation, std::max<std::size_t>(calls(operation).size(), 1) - 1);
 }
 
 std::string ScriptedCamera::lastRecalled() const {

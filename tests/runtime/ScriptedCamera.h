@@ -76,6 +76,11 @@ class ScriptedCamera {
     std::vector<std::string> presetsNamed(const std::string& name) const;
     std::vector<CameraCall> calls(const std::string& operation = "") const;
     int count(const std::string& operation) const { return static_cast<int>(calls(operation).size()); }
+    /// The request for that operation of that number, from 0. One that has not come yet is waited for; the test fails
+    /// and gets an empty one if it does not come.
+    CameraCall call(const std::string& operation, std::size_t number = 0) const;
+    /// The newest request for that operation; the first is waited for in the same way.
+    CameraCall lastCall(const std::string& operation) const;
     std::string lastRecalled() const;
 
     /// Waits until the condition holds.

@@ -3,6 +3,7 @@
 #include "runtime/Steering.h"
 #include "tests/runtime/Patience.h"
 #include "tests/runtime/ScriptedCamera.h"
+#include "tests/runtime/Stopwatch.h"
 
 #include <gtest/gtest.h>
 

@@ -1,5 +1,5 @@
 add_library(qivo_scripted_camera STATIC RawServer.cpp RawServer.h ScriptedCamera.cpp ScriptedCamera.h
-                                        SteeringFixture.cpp SteeringFixture.h Patience.h)
+                                        SteeringFixture.cpp SteeringFixture.h Stopwatch.cpp Stopwatch.h Patience.h)
 target_link_libraries(qivo_scripted_camera PUBLIC qivo_runtime_steering GTest::gtest PRIVATE PkgConfig::GSTREAMER)
 
 qivo_test(test-steering-parts SOURCES SteeringPartsTest.cpp SteeringQueueTest.cpp LIBRARIES qivo_runtime_steering TSAN)
