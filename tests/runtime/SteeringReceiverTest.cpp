@@ -1,5 +1,6 @@
 // From the announcement to the camera: what an application sees of steering, and what the camera sees of its end.
 
+#include "runtime/ReceiverLoop.h"
 #include "tests/runtime/ReceiverFixture.h"
 #include "tests/runtime/SteeringFixture.h"
 #include "tests/support/Process.h"
@@ -20,6 +21,9 @@ using runtime::Announcement;
 
 const std::string kPicture = "width=160,height=120,framerate=25/1";
 constexpr int kUsualPort = 80;
+constexpr auto kWatched = 1200ms; // by then a receiver knows from the pictures how fast they come
+/// Twice what it takes where the machine was too busy for pictures to come steadily: missed late, and taken apart.
+constexpr auto kComesBack = 2 * (runtime::kFirstStallLimit + runtime::kEndingLimit);
 
 class SteeringReceiverTest : public ReceiverFixture {
   protected:
@@ -47,9 +51,14 @@ class SteeringReceiverTest : public ReceiverFixture {
 
     /// Sends nothing until the receiver has connected anew, and then pictures again.
     void comeBack(runtime::Receiver& receiver) {
+        // A source whose pace is known is missed sooner.
+        const auto known = Clock::now() + kWatched;
+        while (Clock::now() < known) {
+            ASSERT_TRUE(nextPicture(receiver));
+        }
         const int connections = m_source.connections();
         m_source.setSilent(true);
-        ASSERT_TRUE(ScriptedCamera::until([&] { return m_source.connections() > connections; }));
+        ASSERT_TRUE(ScriptedCamera::until([&] { return m_source.connections() > connections; }, kComesBack));
         m_source.setSilent(false);
         ASSERT_TRUE(nextPicture(receiver));
     }
@@ -62,7 +71,9 @@ TEST_F(SteeringReceiverTest, TheFindingOfACameraIsAStatusChange) {
     const auto receiver = receive("", "STUDIO (Dome)");
     announce(camera.url());
     ASSERT_TRUE(offersSteering(*receiver));
-    EXPECT_TRUE(receiver->steering()->panTilt(0.5F, 0));
+    const auto steering = receiver->steering();
+    ASSERT_TRUE(steering);
+    EXPECT_TRUE(steering->panTilt(0.5F, 0));
     EXPECT_TRUE(camera.until([&] { return camera.speed().pan == -0.5F; }));
     EXPECT_TRUE(nextPicture(*receiver));
 }
@@ -90,7 +101,7 @@ TEST_F(SteeringReceiverTest, ASourceThatAnnouncesNothingIsAskedAtTheUsualPlace) 
     const ScriptedCamera camera(nullptr, kUsualPort);
     const auto receiver = receive(m_source.url());
     ASSERT_TRUE(offersSteering(*receiver));
-    EXPECT_EQ(camera.calls("GetCapabilities")[0].path, "/onvif/device_service");
+    EXPECT_EQ(camera.call("GetCapabilities").path, "/onvif/device_service");
 }
 
 TEST_F(SteeringReceiverTest, AnotherCameraOnTheSourcesHostIsNotTaken) {
@@ -110,12 +121,14 @@ TEST_F(SteeringReceiverTest, AnAnnouncementThatLeadsElsewhereStopsTheCameraThatW
     const auto receiver = receive("", "STUDIO (Dome)");
     announce(first.url());
     ASSERT_TRUE(offersSteering(*receiver));
-    EXPECT_TRUE(receiver->steering()->zoom(0.5F));
+    auto steering = receiver->steering();
+    ASSERT_TRUE(steering);
+    EXPECT_TRUE(steering->zoom(0.5F));
     ASSERT_TRUE(first.until([&] { return first.moves(); }));
     announce(second.url());
     ASSERT_TRUE(first.until([&] { return !first.moves(); }));
-    ASSERT_TRUE(first.until([&] { return receiver->steering() != nullptr; }));
-    EXPECT_TRUE(receiver->steering()->zoom(-0.5F));
+    ASSERT_TRUE(first.until([&] { return (steering = receiver->steering()) != nullptr; }));
+    EXPECT_TRUE(steering->zoom(-0.5F));
     EXPECT_TRUE(second.until([&] { return second.moves(); }));
     EXPECT_FALSE(first.moves());
 }
@@ -143,12 +156,12 @@ TEST_F(SteeringReceiverTest, ACameraIsAskedAnewWhenItsSourceHasComeBack) {
     *restarted = true;
     ASSERT_NO_FATAL_FAILURE(comeBack(*receiver));
     EXPECT_TRUE(receiver->steering()) << "it was never without";
-    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") == 2; }));
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") >= 2; }));
     EXPECT_TRUE(camera.until([&] {
         const auto steering = receiver->steering();
         return steering && steering->panTilt(0.5F, 0) && camera.until([&] { return camera.moves(); }, 200ms);
     }));
-    EXPECT_EQ(camera.calls("ContinuousMove").back().after("ProfileToken>"), "dome2");
+    EXPECT_EQ(camera.lastCall("ContinuousMove").after("ProfileToken>"), "dome2");
 }
 
 TEST_F(SteeringReceiverTest, ARecallGoesOnWhenItsSourceHasComeBack) {
@@ -159,12 +172,13 @@ TEST_F(SteeringReceiverTest, ARecallGoesOnWhenItsSourceHasComeBack) {
     ASSERT_TRUE(offersSteering(*receiver));
     ASSERT_TRUE(nextPicture(*receiver));
     const auto before = receiver->steering();
+    ASSERT_TRUE(before);
     EXPECT_TRUE(before->recall(7, 0.25F));
     ASSERT_TRUE(camera.until([&] { return camera.glides(); }));
     ASSERT_NO_FATAL_FAILURE(comeBack(*receiver));
-    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") == 2; }));
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") >= 2; }));
     EXPECT_FALSE(camera.until([&] { return receiver->steering() != before; }, 500ms));
-    EXPECT_TRUE(receiver->steering()->recall(7, 0.25F));
+    EXPECT_TRUE(before->recall(7, 0.25F));
     ASSERT_TRUE(camera.until([&] { return camera.count("GotoPreset") == 2; }));
     EXPECT_FALSE(camera.until([&] { return camera.count("Stop") != 0; }, 500ms)) << "it ended half way";
     EXPECT_TRUE(before->panTilt(0, 0));
@@ -180,14 +194,20 @@ TEST_F(SteeringReceiverTest, ACameraIsAskedAnewAtEveryReturnOfItsSource) {
     announce(camera.url());
     ASSERT_TRUE(offersSteering(*receiver));
     ASSERT_TRUE(nextPicture(*receiver));
-    EXPECT_TRUE(receiver->steering()->panTilt(0.5F, 0));
+    const auto before = receiver->steering();
+    ASSERT_TRUE(before);
+    EXPECT_TRUE(before->panTilt(0.5F, 0));
+    // On a busy machine a source may also go and return unasked.
     ASSERT_NO_FATAL_FAILURE(comeBack(*receiver));
-    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") == 2; }));
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") >= 2; }));
+    EXPECT_EQ(receiver->steering(), before);
     *restarted = true;
+    const int asked = camera.count("GetMoveOptions");
     ASSERT_NO_FATAL_FAILURE(comeBack(*receiver));
-    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") == 3; }));
+    ASSERT_TRUE(camera.until([&] { return camera.count("GetMoveOptions") > asked; }));
     EXPECT_TRUE(camera.until([&] {
-        return receiver->steering()->zoom(0.5F) && camera.until([&] { return camera.speed().zoom == 0.5F; }, 200ms);
+        const auto steering = receiver->steering();
+        return steering && steering->zoom(0.5F) && camera.until([&] { return camera.speed().zoom == 0.5F; }, 200ms);
     }));
     // Not necessarily the last one: what steered before stops the camera beside it.
     const auto moves = camera.calls("ContinuousMove");
@@ -242,10 +262,12 @@ TEST_P(SteeringEnds, LeaveTheCameraStanding) {
         ASSERT_TRUE(child->waitForOutput("ending"));
     } else {
         child->signal(end.signal);
+        // Until it is gone it may still ask for a move, and on a busy machine a signal takes its time as well.
+        ASSERT_TRUE(camera.until([&] { return !child->running(); }));
     }
-    const auto ended = Clock::now();
+    const Stopwatch ended;
     ASSERT_TRUE(camera.until([&] { return !camera.moves(); }, 3s * kSanitizerPatience));
-    EXPECT_LT(Clock::now() - ended, 1s + 50ms * kSanitizerPatience);
+    EXPECT_LT(ended.passed(), 1s + 50ms * kSanitizerPatience);
 }
 
 class SteeringRecallEnds : public testing::TestWithParam<const char*> {};
@@ -259,9 +281,9 @@ TEST_P(SteeringRecallEnds, LeaveTheCameraStanding) {
     ASSERT_TRUE(child->waitForOutput("turning")) << child->output() << child->errors();
     ASSERT_TRUE(camera.until([&] { return camera.glides(); }));
     ASSERT_TRUE(child->waitForOutput("ending"));
-    const auto ended = Clock::now();
+    const Stopwatch ended;
     ASSERT_TRUE(camera.until([&] { return !camera.glides(); }, 3s * kSanitizerPatience));
-    EXPECT_LT(Clock::now() - ended, 1s + 50ms * kSanitizerPatience);
+    EXPECT_LT(ended.passed(), 1s + 50ms * kSanitizerPatience);
 }
 
 INSTANTIATE_TEST_SUITE_P(Process, SteeringRecallEnds, testing::Values("receiver", "library", "exit"),
