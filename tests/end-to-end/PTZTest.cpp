@@ -19,6 +19,7 @@ using testing::HasSubstr;
 
 constexpr int kSceneShare = 14;        // of 18 parts of the picture's height; below it is the band with the codes
 constexpr double kClearlyMoved = 0.02; // of the camera's range of -1 to 1; a tap moves it by half of that
+constexpr double kFarIn = 0.25;        // of its range of 0 to 1: seconds from its limit
 constexpr double kSamePlace = 0.002;   // two steps of the position code
 constexpr milliseconds kStanding(400); // without motion for so long by the picture's clock
 constexpr milliseconds kStandsWithin(1000);
@@ -120,7 +121,9 @@ class PTZTest : public ViewerTest {
 
     void openPanel() {
         ASSERT_TRUE(eventually([&] {
-            m_screen->activate(*window());
+            if (const auto main = window()) {
+                m_screen->activate(*main);
+            }
             m_screen->key("Alt+c");
             m_screen->key("c"); // by its letter: its place depends on whether the page before it is known
             if (eventually([&] { return m_screen->findWindow(kPanel).has_value(); }, milliseconds(700))) {
@@ -130,7 +133,7 @@ class PTZTest : public ViewerTest {
             m_screen->key("Escape");
             return false;
         })) << "the panel cannot be opened from the menu";
-        ASSERT_TRUE(eventually([&] { return m_screen->isActive(*m_screen->findWindow(kPanel)); }));
+        ASSERT_TRUE(eventually([&] { return isActive(kPanel); }));
     }
 
     /// Watches a camera with the panel open, once it obeys.
@@ -197,7 +200,7 @@ TEST_F(PTZTest, DraggingOffTheZoomOutButtonStopsTheZoom) {
     const auto publisher = publish("STUDIO", {"Cam 1"}, {"--ptz"});
     ASSERT_NO_FATAL_FAILURE(steer(0, "STUDIO (Cam 1)"));
     press(kZoomIn);
-    EXPECT_TRUE(shows([&](const PositionCode& at) { return at.zoom > 3 * kClearlyMoved; }));
+    EXPECT_TRUE(shows([&](const PositionCode& at) { return at.zoom > kFarIn; }));
     m_screen->release();
     const auto near = stands();
     ASSERT_TRUE(near);
@@ -233,28 +236,48 @@ TEST_F(PTZTest, APresetIsStoredAndRecalled) {
     EXPECT_NEAR(after->y, before->y, 2);
 }
 
-/// The pictures of a camera as a second watcher gets them.
+/// The pictures of a camera as a second watcher gets them, by the clock in them.
 struct Track {
-    std::int64_t lastMotion = 0;
+    std::optional<PositionCode> last;
     std::int64_t lastPicture = 0;
+    // The camera last moved between these two pictures. They may be far apart where the machine is busy.
+    std::int64_t beforeMotion = 0;
+    std::int64_t lastMotion = 0;
     int motions = 0;
 };
 
+void followNext(Watcher& watcher, Track& track) {
+    const auto frame = watcher.next(seconds(5));
+    ASSERT_TRUE(frame) << "no more pictures";
+    const auto at = readPositionCode(frame->pixels.data(), frame->width, frame->height,
+                                     static_cast<std::ptrdiff_t>(4) * frame->width);
+    const auto time = frame->timeCode();
+    if (!at || !time) {
+        return;
+    }
+    if (track.last && distance(*at, *track.last) > 0) {
+        ++track.motions;
+        track.beforeMotion = track.lastPicture;
+        track.lastMotion = *time;
+    }
+    track.lastPicture = *time;
+    track.last = at;
+}
+
 /// Follows the camera until the clock in its pictures says that time.
-void follow(Watcher& watcher, std::int64_t until, std::optional<PositionCode>& last, Track& track) {
+void follow(Watcher& watcher, std::int64_t until, Track& track) {
     while (track.lastPicture < until) {
-        const auto frame = watcher.next(seconds(5));
-        ASSERT_TRUE(frame) << "no more pictures";
-        const auto at = readPositionCode(frame->pixels.data(), frame->width, frame->height,
-                                         static_cast<std::ptrdiff_t>(4) * frame->width);
-        const auto time = frame->timeCode();
-        if (at && time) {
-            const bool moved = last && distance(*at, *last) > 0;
-            track.motions += moved ? 1 : 0;
-            track.lastMotion = moved ? *time : track.lastMotion;
-            track.lastPicture = *time;
-            last = at;
-        }
+        ASSERT_NO_FATAL_FAILURE(followNext(watcher, track));
+    }
+}
+
+/// Follows the camera until it has moved in some pictures.
+void followMotion(Watcher& watcher, Track& track) {
+    constexpr int kEnough = 4;
+    const auto limit = std::chrono::steady_clock::now() + seconds(20);
+    while (track.motions < kEnough) {
+        ASSERT_LT(std::chrono::steady_clock::now(), limit) << "the camera does not move";
+        ASSERT_NO_FATAL_FAILURE(followNext(watcher, track));
     }
 }
 
@@ -275,21 +298,20 @@ TEST_F(PTZTest, TurningToTheMainWindowStopsTheCameraAndAnotherSourceClosesThePan
     const auto publisher = publish("STUDIO", {"Cam 1", "Cam 2"}, {"--ptz"});
     ASSERT_NO_FATAL_FAILURE(steer(0, "STUDIO (Cam 1)"));
     Watcher watcher(addressOf(*publisher), "tcp");
-    std::optional<PositionCode> last;
     Track track;
     press(kPanLeft);
-    ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + 500, last, track));
-    EXPECT_GT(track.motions, 3) << "the camera does not move";
+    ASSERT_NO_FATAL_FAILURE(followMotion(watcher, track));
     const std::int64_t turned = now();
-    m_screen->activate(*window());
-    ASSERT_TRUE(eventually([&] { return m_screen->isActive(*window()); }));
+    ASSERT_TRUE(turnTo(m_title));
+    const std::int64_t isThere = now(); // the window manager takes its time, too
+    ASSERT_NO_FATAL_FAILURE(follow(watcher, isThere + kStandsWithin.count() + 1, track)); // before what takes long
     choose(0, 1, "STUDIO (Cam 2)");
     EXPECT_TRUE(eventually([&] { return !m_screen->findWindow(kPanel).has_value(); }));
-    ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + kStandsWithin.count(), last, track));
+    ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + kStandsWithin.count(), track));
     m_screen->release();
-    ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + kStandsWithin.count(), last, track));
+    ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + kStandsWithin.count(), track));
     EXPECT_GT(track.lastMotion, turned - 200) << "it stood before";
-    EXPECT_LE(track.lastMotion, turned + kStandsWithin.count()) << "in ms; the button was held until the end";
+    EXPECT_LE(track.beforeMotion, isThere + kStandsWithin.count()) << "in ms; the button was held until the end";
     ASSERT_TRUE(picturesArrive(now()));
     EXPECT_TRUE(shows([](const PositionCode& at) { return distance(at, {}) <= kSamePlace; }));
 }
@@ -303,10 +325,9 @@ TEST_F(PTZTest, LowBandwidthToggledWhileAButtonIsHeldSteersThisCameraAlone) {
     EXPECT_TRUE(stands()) << "the receiver that moved it has gone";
     m_screen->release();
     ASSERT_TRUE(m_screen->findWindow(kPanel)) << "the panel stays";
-    m_screen->activate(*m_screen->findWindow(kPanel));
+    ASSERT_TRUE(turnTo(kPanel));
     ASSERT_NO_FATAL_FAILURE(waitForControl());
-    m_screen->activate(*window());
-    ASSERT_TRUE(eventually([&] { return m_screen->isActive(*window()); }));
+    ASSERT_TRUE(turnTo(m_title));
     choose(0, 1, "STUDIO (Cam 2)");
     EXPECT_TRUE(shows([](const PositionCode& at) { return distance(at, {}) <= kSamePlace; }))
         << "the other camera was steered";
@@ -317,16 +338,14 @@ TEST_F(PTZTest, AViewerKilledWhileAButtonIsHeldLeavesTheCameraStandingWithinASec
     const auto publisher = publish("STUDIO", {"Cam 1"}, {"--ptz"});
     ASSERT_NO_FATAL_FAILURE(steer(0, "STUDIO (Cam 1)"));
     Watcher watcher(addressOf(*publisher), "tcp");
-    std::optional<PositionCode> last;
     Track track;
     press(kPanLeft);
-    ASSERT_NO_FATAL_FAILURE(follow(watcher, now() + 500, last, track));
-    EXPECT_GT(track.motions, 3) << "the camera does not move";
+    ASSERT_NO_FATAL_FAILURE(followMotion(watcher, track));
     const std::int64_t killed = now();
     m_viewer->signal(SIGKILL);
-    ASSERT_NO_FATAL_FAILURE(follow(watcher, killed + 2 * kStandsWithin.count(), last, track));
+    ASSERT_NO_FATAL_FAILURE(follow(watcher, killed + 2 * kStandsWithin.count(), track));
     EXPECT_GT(track.lastMotion, killed - 200) << "it stood before";
-    EXPECT_LE(track.lastMotion, killed + kStandsWithin.count()) << "in ms";
+    EXPECT_LE(track.beforeMotion, killed + kStandsWithin.count()) << "in ms";
     m_viewer->wait(seconds(5));
     m_screen->release();
 }

@@ -66,7 +66,7 @@ TEST_F(RecordingTest, ChoosingAnotherSourceFinishesTheMovieAndClosingTheWindowTh
     EXPECT_THAT(recorded(), SizeIs(1)) << "recording does not carry over to the new source";
     startRecording();
     recordFor(milliseconds(700));
-    m_screen->close(*window());
+    ASSERT_TRUE(closeWindow());
     EXPECT_EQ(m_viewer->wait(seconds(10)), 0) << m_viewer->errors();
     EXPECT_TRUE(isFinished(movie("STUDIO (Cam 2)")));
     expectWholeRecording(movie("STUDIO (Cam 1)"), 0.6, false);
@@ -95,6 +95,7 @@ TEST_F(RecordingTest, KilledRecorderLeavesAMovieThatPlaysAndTheNextIsMadeBesideI
     EXPECT_TRUE(recordSwitchShowsOn()) << "nothing resets the switch";
     const DecodedMovie decoded = decodeMovie(movie());
     ASSERT_TRUE(decoded.readable) << decoded.error;
+    ASSERT_FALSE(decoded.pictures.empty());
     EXPECT_GE(decoded.pictures.back().published.value_or(0), killed - 1000);
     clickRecordSwitch();
     startRecording();

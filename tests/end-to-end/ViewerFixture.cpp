@@ -67,14 +67,14 @@ void ViewerTest::startViewer(const std::vector<std::string>& environment) {
     m_viewer = Process::start({VIEWER}, environment);
     ASSERT_NE(m_viewer, nullptr);
     ASSERT_TRUE(eventually([this] { return window().has_value(); })) << m_viewer->errors();
-    m_screen->activate(*window());
-    ASSERT_TRUE(eventually([this] { return m_screen->isActive(*window()); }));
+    ASSERT_TRUE(turnTo(m_title));
     // Drawn for the first time, too: what is compared later must not change for that reason alone.
     Picture last;
     ASSERT_TRUE(eventually([&] {
         std::this_thread::sleep_for(kPressedLook);
-        const Picture earlier = std::exchange(last, m_screen->grab(*window()));
-        return !last.empty() && last.pixels == earlier.pixels && m_screen->largestChild(*window());
+        const auto main = window();
+        const Picture earlier = std::exchange(last, main ? m_screen->grab(*main) : Picture());
+        return main && !last.empty() && last.pixels == earlier.pixels && m_screen->largestChild(*main);
     }));
 }
 
@@ -123,7 +123,7 @@ void ViewerTest::turnSwitch(const std::function<void()>& turn) {
 
 Window ViewerTest::switches() const {
     const Window inside = view();
-    const int height = inside.y - window()->y;
+    const int height = inside.y - window().value_or(inside).y;
     return {0, inside.x + inside.width - kSwitchesWidth, inside.y - height, kSwitchesWidth, height};
 }
 
@@ -146,6 +146,27 @@ std::optional<Window> ViewerTest::window() const {
     return m_screen->findWindow(m_title);
 }
 
+bool ViewerTest::isActive(const std::string& title) const {
+    const auto found = m_screen->findWindow(title);
+    return found && m_screen->isActive(*found);
+}
+
+bool ViewerTest::turnTo(const std::string& title) const {
+    const auto found = m_screen->findWindow(title);
+    if (found) {
+        m_screen->activate(*found);
+    }
+    return eventually([&] { return isActive(title); });
+}
+
+bool ViewerTest::closeWindow() const {
+    const auto found = window();
+    if (found) {
+        m_screen->close(*found);
+    }
+    return found.has_value();
+}
+
 Window ViewerTest::view() const {
     const auto main = window();
     const auto child = main ? m_screen->largestChild(*main) : std::nullopt;
@@ -157,7 +178,11 @@ Window ViewerTest::view() const {
 }
 
 bool ViewerTest::sizeView(int width, int height) const {
-    const Window main = *window();
+    const auto found = window();
+    if (!found) {
+        return false;
+    }
+    const Window& main = *found;
     const Window inside = view();
     m_screen->move(main, 0, 0);
     m_screen->resize(main, width + main.width - inside.width, height + main.height - inside.height);

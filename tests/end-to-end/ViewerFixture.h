@@ -48,6 +48,12 @@ class ViewerTest : public testing::Test {
     bool recordSwitchShowsOn() const;
 
     std::optional<Window> window() const;
+    /// Whether there is a window of that title that has the keyboard.
+    bool isActive(const std::string& title) const;
+    /// Gives the window of that title the keyboard, and waits until it has it. False if that does not come about.
+    bool turnTo(const std::string& title) const;
+    /// Asks the viewer's window to close. False if there is none.
+    bool closeWindow() const;
     /// The picture's own window inside the main window.
     Window view() const;
     /// Sizes the main window so that its view has this size, in pixels.

@@ -200,7 +200,7 @@ TEST_F(ViewerTest, ClosingTheWindowEndsInOrderAndSavesTheSettings) {
     ASSERT_TRUE(picturesArrive());
     pressSwitch("Control+l");
     ASSERT_TRUE(picturesArrive(now()));
-    m_screen->close(*window());
+    ASSERT_TRUE(closeWindow());
     EXPECT_EQ(m_viewer->wait(seconds(10)), 0) << m_viewer->errors();
     EXPECT_THAT(m_viewer->output(),
                 HasSubstr("Destroying the QIVO receiver \nThe QIVO receiver has been destroyed \n"));
@@ -227,7 +227,7 @@ TEST_F(ViewerTest, WithoutALibraryTheViewerStartsAndSaysWhy) {
     EXPECT_TRUE(eventually([this] { return window().has_value(); }));
     EXPECT_TRUE(m_viewer->waitForOutput("Cannot run QIVO."));
     EXPECT_THAT(m_viewer->errors(), HasSubstr("libqivo.so: cannot open shared object file"));
-    m_screen->close(*window());
+    ASSERT_TRUE(closeWindow());
     EXPECT_EQ(m_viewer->wait(seconds(10)), 0);
 }
 
