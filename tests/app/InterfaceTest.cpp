@@ -225,7 +225,7 @@ class UserTest : public InterfaceTest {
         window().move(60, 60);
         window().show();
         ASSERT_TRUE(runUntil([&] { return window().isActiveWindow() && screen->findWindow("QIVO Viewer"); }));
-        onScreen = *screen->findWindow("QIVO Viewer");
+        onScreen = screen->findWindow("QIVO Viewer").value();
         ASSERT_TRUE(runUntil([&] { return screen->largestChild(onScreen).has_value(); }));
     }
 
@@ -591,7 +591,7 @@ TEST_F(TwoScreensTest, MenusAndShortcutsWorkAfterTheWindowHasMovedToAScreenWithA
     ASSERT_EQ(window().devicePixelRatio(), 1);
     expectKeysToWork();
     const auto title = window().windowTitle().toStdString();
-    screen->move(*screen->findWindow(title), 660, 60);
+    screen->move(screen->findWindow(title).value(), 660, 60);
     ASSERT_TRUE(runUntil([&] { return window().devicePixelRatio() == 2; }));
     expectKeysToWork();
     clickPicture();

@@ -61,7 +61,7 @@ class ProgramTest : public testing::Test {
 
     /// Its menus and shortcuts do, and it ends as it should.
     void expectThatItWorks(Process& program) const {
-        screen->activate(*screen->findWindow("QIVO Viewer"));
+        screen->activate(screen->findWindow("QIVO Viewer").value());
         EXPECT_TRUE(eventually([&] { return screen->key("Control+q") && !program.running(); }));
         EXPECT_EQ(program.wait(kSoon), 0);
         EXPECT_THAT(saved(), HasSubstr("ORVQIVOViewer_mute=false"));
@@ -82,7 +82,7 @@ TEST_F(ProgramTest, ClosingTheWindowEndsItAndSavesTheSettings) {
     const auto program = startWithLibrary();
     ASSERT_TRUE(waitForWindow());
     EXPECT_TRUE(program->waitForOutput("stand-in: initialize\n"));
-    screen->close(*screen->findWindow("QIVO Viewer"));
+    screen->close(screen->findWindow("QIVO Viewer").value());
     EXPECT_EQ(program->wait(kSoon), 0);
     EXPECT_EQ(program->output(), "stand-in: initialize\nstand-in: destroy\n");
     EXPECT_EQ(saved(), "[General]\nORVQIVOViewer_isLowBandwith=true\nORVQIVOViewer_mute=false\n"
@@ -93,7 +93,7 @@ TEST_F(ProgramTest, ClosingTheWindowEndsItAndSavesTheSettings) {
 TEST_F(ProgramTest, QuitByKeyEndsItWithSuccess) {
     const auto program = startWithLibrary();
     ASSERT_TRUE(waitForWindow());
-    screen->activate(*screen->findWindow("QIVO Viewer"));
+    screen->activate(screen->findWindow("QIVO Viewer").value());
     EXPECT_TRUE(eventually([&] { return screen->key("Control+q") && !program->running(); }));
     EXPECT_EQ(program->wait(kSoon), 0);
     EXPECT_THAT(saved(), HasSubstr("ORVQIVOViewer_mute=false"));
@@ -125,7 +125,7 @@ TEST_F(ProgramTest, TerminationEndsThePlayerThenTheFinderThenTheRecorderThenSave
     };
     const auto program = start({std::string("LD_LIBRARY_PATH=") + STAND_INS + "/complete", "STAND_IN_NOTES=" + notes});
     ASSERT_TRUE(waitForWindow());
-    screen->activate(*screen->findWindow("QIVO Viewer"));
+    screen->activate(screen->findWindow("QIVO Viewer").value());
     ASSERT_TRUE(eventually([&] {
         for (const char* key : {"Alt+s", "Right", "Return"}) {
             screen->key(key);
@@ -146,7 +146,7 @@ TEST_F(ProgramTest, FolderForRecordingsIsChosenInASheetThatDoesNotKeepASignalFro
     std::filesystem::create_directory(folder.path("takes"));
     const auto program = startWithLibrary();
     ASSERT_TRUE(waitForWindow());
-    screen->activate(*screen->findWindow("QIVO Viewer"));
+    screen->activate(screen->findWindow("QIVO Viewer").value());
     const auto sheet = [&] { return screen->findWindow("Choose the directory for recordings."); };
     const auto openSheet = [&] {
         return eventually([&] {
@@ -156,7 +156,7 @@ TEST_F(ProgramTest, FolderForRecordingsIsChosenInASheetThatDoesNotKeepASignalFro
         });
     };
     ASSERT_TRUE(openSheet());
-    EXPECT_TRUE(eventually([&] { return screen->isActive(*sheet()); }));
+    EXPECT_TRUE(eventually([&] { return screen->isActive(sheet().value()); }));
     for (const char* key : {"t", "a", "k", "e", "s", "Return"}) {
         screen->key(key);
     }

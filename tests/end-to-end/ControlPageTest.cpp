@@ -70,6 +70,12 @@ class ControlPagesTest : public ViewerTest {
                                       : readPositionCode(picture.pixels.data(), picture.width, picture.height,
                                                          static_cast<std::ptrdiff_t>(4) * picture.width);
     }
+    /// The same, of the next picture that can be read.
+    PositionCode place() {
+        std::optional<PositionCode> now;
+        EXPECT_TRUE(eventually([&] { return (now = position()).has_value(); })) << "no position in the picture";
+        return now.value_or(PositionCode{});
+    }
     /// Waits for a picture of the camera for which the condition holds.
     bool seen(const std::function<bool(const PositionCode&)>& condition) {
         return eventually([&] {
@@ -147,17 +153,17 @@ TEST_F(ControlPagesTest, theViewersCommandOpensThePageAndAButtonHeldMovesThePict
     const std::vector<int> after = scene();
     std::this_thread::sleep_for(300ms);
     EXPECT_LT(difference(after, scene()), 1);
-    EXPECT_GT(position()->pan, -0.95) << "it ran to its end";
+    EXPECT_GT(place().pan, -0.95) << "it ran to its end";
     EXPECT_THAT(m_browser->complaints(), testing::IsEmpty());
 }
 
 TEST_F(ControlPagesTest, leavingTheButtonAnotherTabAndAStoppedBrowserStopTheCamera) {
-    openPage();
+    ASSERT_NO_FATAL_FAILURE(openPage());
     m_browser->press(".left");
     ASSERT_TRUE(seen([](const PositionCode& now) { return now.pan < -0.05; }));
     m_browser->dragTo("#picture");
     EXPECT_TRUE(stands());
-    EXPECT_GT(position()->pan, -0.95);
+    EXPECT_GT(place().pan, -0.95);
     m_browser->releaseAll();
 
     m_browser->press(".right");
@@ -167,7 +173,7 @@ TEST_F(ControlPagesTest, leavingTheButtonAnotherTabAndAStoppedBrowserStopTheCame
                    "Object.defineProperty(document, 'hidden', {value: false});"
                    "document.dispatchEvent(new Event('visibilitychange'));");
     EXPECT_TRUE(stands());
-    EXPECT_LT(position()->pan, 0.95);
+    EXPECT_LT(place().pan, 0.95);
     m_browser->releaseAll();
 
     // The page is still there and renews no more, as where its machine fell asleep.
@@ -177,11 +183,11 @@ TEST_F(ControlPagesTest, leavingTheButtonAnotherTabAndAStoppedBrowserStopTheCame
                    "window.fetch = (url, ...rest) => url.endsWith('/command') ? new Promise(() => {}) : "
                    "window.fetchAsItWas(url, ...rest);");
     EXPECT_TRUE(stands(1200ms));
-    EXPECT_LT(position()->zoom, 0.95);
+    EXPECT_LT(place().zoom, 0.95);
 }
 
 TEST_F(ControlPagesTest, keysTurnStoreAndRecall) {
-    openPage();
+    ASSERT_NO_FATAL_FAILURE(openPage());
     m_browser->typeKey("s");
     m_browser->typeKey("3");
     EXPECT_TRUE(eventually(
@@ -190,7 +196,7 @@ TEST_F(ControlPagesTest, keysTurnStoreAndRecall) {
     EXPECT_TRUE(seen([](const PositionCode& now) { return now.pan < -0.1; }));
     m_browser->releaseAll();
     EXPECT_TRUE(stands());
-    EXPECT_LT(position()->pan, -0.1);
+    EXPECT_LT(place().pan, -0.1);
     m_browser->holdKey("+");
     EXPECT_TRUE(seen([](const PositionCode& now) { return now.zoom > 0.1; }));
     m_browser->releaseAll();
@@ -202,13 +208,13 @@ TEST_F(ControlPagesTest, keysTurnStoreAndRecall) {
 }
 
 TEST_F(ControlPagesTest, aFingerOnAPhoneTurnsUntilItLeaves) {
-    openPage(true);
+    ASSERT_NO_FATAL_FAILURE(openPage(true));
     EXPECT_EQ(m_browser->run("return document.documentElement.scrollWidth > innerWidth").toBool(true), false);
     m_browser->press(".up");
     EXPECT_TRUE(seen([](const PositionCode& now) { return now.tilt > 0.1; }));
     m_browser->releaseAll();
     EXPECT_TRUE(stands());
-    EXPECT_LT(position()->tilt, 0.95);
+    EXPECT_LT(place().tilt, 0.95);
     m_browser->click("#store");
     m_browser->click("#presets button:nth-child(2)");
     EXPECT_TRUE(eventually([this] {
@@ -219,19 +225,19 @@ TEST_F(ControlPagesTest, aFingerOnAPhoneTurnsUntilItLeaves) {
 
 TEST_F(ControlPagesTest, theLoginOfThePageIsTheLoginOfItsCommands) {
     serve({"--login", "ann:secret"});
-    openPage(false, "ann:secret@");
+    ASSERT_NO_FATAL_FAILURE(openPage(false, "ann:secret@"));
     EXPECT_EQ(m_browser->text("#name"), "STUDIO (Cam 1)");
     m_browser->press(".left");
     EXPECT_TRUE(seen([](const PositionCode& now) { return now.pan < -0.2; }));
     m_browser->releaseAll();
     EXPECT_TRUE(stands());
-    EXPECT_GT(position()->pan, -0.95);
+    EXPECT_GT(place().pan, -0.95);
     EXPECT_TRUE(eventually([this] { return m_browser->text("#state") == "Live"; }));
     EXPECT_EQ(m_browser->text("#viewers"), "1 viewer");
 }
 
 TEST_F(ControlPagesTest, theFocusGoesFromFarToNearAndBackToTheAutomatic) {
-    openPage();
+    ASSERT_NO_FATAL_FAILURE(openPage());
     const auto isAutomatic = [this] {
         return m_browser->run("return document.getElementById(\"automatic\").checked").toBool();
     };
@@ -256,7 +262,7 @@ TEST_F(ControlPagesTest, theFocusGoesFromFarToNearAndBackToTheAutomatic) {
 }
 
 TEST_F(ControlPagesTest, onlyTheNewestPlaceOfTheFocusIsSent) {
-    openPage();
+    ASSERT_NO_FATAL_FAILURE(openPage());
     // The first command is held back for a while; meanwhile the slider moves on.
     m_browser->run("window.places = []; window.fetchAsItWas = window.fetch;"
                    "window.fetch = async (url, options) => {"
@@ -276,7 +282,7 @@ TEST_F(ControlPagesTest, onlyTheNewestPlaceOfTheFocusIsSent) {
 }
 
 TEST_F(ControlPagesTest, aPublisherThatGoesIsSaid) {
-    openPage();
+    ASSERT_NO_FATAL_FAILURE(openPage());
     ASSERT_TRUE(eventually([this] { return m_browser->text("#state") == "Live"; }));
     m_publisher->signal(SIGKILL);
     EXPECT_TRUE(eventually([this] { return m_browser->text("#state") == "No connection"; }));

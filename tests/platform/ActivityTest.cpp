@@ -188,7 +188,7 @@ TEST_F(ActivityTest, AsksThePortalAndReleasesItAtItsEnd) {
                                             "login inhibit idle:sleep QIVO Viewer: realtime UDP receiving block"));
     EXPECT_FALSE(login.isReleased());
     end(activity);
-    EXPECT_TRUE(runUntil([&] { return calls.size() >= 3 && login.isReleased(); }));
+    ASSERT_TRUE(runUntil([&] { return calls.size() >= 3 && login.isReleased(); }));
     EXPECT_EQ(calls.back(), "portal close");
 }
 
@@ -199,7 +199,7 @@ TEST_F(ActivityTest, AsksTheScreenSaverWhereThereIsNoPortal) {
     EXPECT_TRUE(runUntil([&] { return !calls.empty(); }));
     EXPECT_THAT(calls, ElementsAre("saver inhibit QIVO Viewer: realtime UDP receiving"));
     end(activity);
-    EXPECT_TRUE(runUntil([&] { return calls.size() >= 2; }));
+    ASSERT_TRUE(runUntil([&] { return calls.size() >= 2; }));
     EXPECT_EQ(calls.back(), "saver uninhibit 42");
 }
 

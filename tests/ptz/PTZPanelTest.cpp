@@ -132,7 +132,7 @@ TEST_F(PTZPanelTest, KeyboardLostWhileAKeyIsHeldStopsTheCamera) {
     screen->pressKey("Up");
     screen->pressKey("minus");
     ASSERT_THAT(sentOnce(2), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0.1)", "recv_ptz_zoom_speed(r1, -0.1)"));
-    screen->activate(*screen->findWindow("Main"));
+    screen->activate(screen->findWindow("Main").value());
     EXPECT_THAT(sentOnce(2), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0)", "recv_ptz_zoom_speed(r1, 0)"));
     screen->releaseKey("Up");
     screen->releaseKey("minus");
@@ -142,7 +142,7 @@ TEST_F(PTZPanelTest, KeyboardLostWhileAKeyIsHeldStopsTheCamera) {
 TEST_F(PTZPanelTest, KeyboardLostWhileAButtonIsHeldStopsTheCameraAndReleaseStopsItAgain) {
     press("tiltDown");
     ASSERT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, -0.1)"));
-    screen->activate(*screen->findWindow("Main"));
+    screen->activate(screen->findWindow("Main").value());
     EXPECT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0)"));
     screen->release();
     EXPECT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0)"));
@@ -177,7 +177,7 @@ TEST_F(PTZPanelTest, KeyboardLostWhileKeyAndButtonAreHeldStopsForGood) {
     ASSERT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, 0.1)"));
     screen->pressKey("Down");
     ASSERT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, 0, -0.1)"));
-    screen->activate(*screen->findWindow("Main"));
+    screen->activate(screen->findWindow("Main").value());
     EXPECT_THAT(sentOnce(2), testing::Each("recv_ptz_pan_tilt_speed(r1, 0, 0)"));
     screen->releaseKey("Down");
     screen->release();
@@ -185,7 +185,7 @@ TEST_F(PTZPanelTest, KeyboardLostWhileKeyAndButtonAreHeldStopsForGood) {
 }
 
 TEST_F(PTZPanelTest, ButtonPressedInAPanelWithoutTheKeyboardMovesUntilItIsReleased) {
-    screen->activate(*screen->findWindow("Main"));
+    screen->activate(screen->findWindow("Main").value());
     ASSERT_TRUE(test::runUntil([&] { return window->isActiveWindow(); }));
     press("panRight");
     EXPECT_THAT(sentOnce(1), ElementsAre("recv_ptz_pan_tilt_speed(r1, -0.1, 0)"));
@@ -282,7 +282,7 @@ TEST_F(PTZPanelTest, OpeningAndClosingItSendsNothing) {
     screen->key("Escape");
     EXPECT_TRUE(closes());
     open();
-    screen->close(*screen->findWindow(kTitle));
+    screen->close(screen->findWindow(kTitle).value());
     EXPECT_TRUE(closes());
     EXPECT_THAT(sent(), IsEmpty());
 }
@@ -316,7 +316,7 @@ TEST_F(PTZPanelTest, PanelStaysAboveItsWindow) {
     const QPoint over = window->mapToGlobal(QPoint(40, 20));
     panel->move(over);
     ASSERT_TRUE(test::runUntil([&] { return window->geometry().contains(panel->geometry().topLeft()); }));
-    screen->activate(*screen->findWindow("Main"));
+    screen->activate(screen->findWindow("Main").value());
     ASSERT_TRUE(test::runUntil([&] { return window->isActiveWindow(); }));
     window->raise();
     settle();

@@ -93,7 +93,7 @@ TEST_F(PTZViewControllerTest, LettingGoOnTheZoomOutButtonChangesItsStateAndStops
 }
 
 TEST_F(PTZViewControllerTest, PointerIsTrackedWithoutAnyPressAndInAWindowWithoutTheKeyboard) {
-    screen->activate(*screen->findWindow("Main"));
+    screen->activate(screen->findWindow("Main").value());
     ASSERT_TRUE(test::runUntil([&] { return window->isActiveWindow(); }));
     const QPoint at = middleOf(control("zoomOut"));
     screen->moveTo(at.x(), at.y());
@@ -192,7 +192,7 @@ TEST_F(PTZViewControllerTest, FocusSliderIsDraggedAndGrabbingItAloneCounts) {
 }
 
 TEST_F(PTZViewControllerTest, AutoFocusSendsTheCommandEachTimeAndNothingChangesOnThePanel) {
-    const auto look = [&] { return screen->grab(*screen->findWindow(kTitle)).pixels; };
+    const auto look = [&] { return screen->grab(screen->findWindow(kTitle).value()).pixels; };
     dragAway();
     settle();
     const auto before = look();

@@ -78,6 +78,8 @@ double longestStep(const DecodedMovie& movie) {
 
 /// All that was published between the first and the last picture is there.
 void expectEveryPicture(const DecodedMovie& movie, int rate) {
+    ASSERT_FALSE(movie.pictures.empty());
+    ASSERT_TRUE(movie.pictures.back().published && movie.pictures.front().published);
     const auto span = *movie.pictures.back().published - *movie.pictures.front().published;
     EXPECT_EQ(movie.pictures.size(),
               static_cast<std::size_t>(std::lround(static_cast<double>(span) * rate * 1e-3)) + 1);
@@ -96,7 +98,7 @@ TEST(Recorder, TheClockRunsThroughTheMovieWithPictureAndSoundTogether) {
     EXPECT_EQ(movie.height, 180);
     EXPECT_EQ(movie.rate, 48000);
     EXPECT_EQ(movie.channels, 2);
-    expectClock(movie);
+    ASSERT_NO_FATAL_FAILURE(expectClock(movie));
     expectEveryPicture(movie, 30);
     expectTogether(movie, 2);
     EXPECT_LT(movie.soundJump, 0.001);
@@ -143,6 +145,7 @@ TEST(Recorder, AnotherSizeStandsBetweenBarsInTheMoviesSize) {
     EXPECT_EQ(movie.width, 320);
     EXPECT_EQ(movie.height, 180);
     EXPECT_LT(longestStep(movie), 0.1);
+    ASSERT_FALSE(movie.pictures.empty());
     EXPECT_GT(movie.pictures.front().corner, 40);
     EXPECT_LT(movie.pictures.back().corner, 25) << "a black bar";
     EXPECT_GT(movie.pictures.back().middle, 40);

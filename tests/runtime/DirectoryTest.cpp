@@ -171,7 +171,9 @@ TEST_F(DirectoryTest, AChangedPortAddressOrTextIsSeen) {
     EXPECT_TRUE(seesUrl("CHANGING", "rtsp://127.0.0.2:9554/live"));
     m_responder.announce({text("CHANGING", {"path=/new", "web=https://127.0.0.2/"})});
     EXPECT_TRUE(seesUrl("CHANGING", "rtsp://127.0.0.2:9554/new"));
-    EXPECT_EQ(m_directory->findByName("CHANGING")->web, "https://127.0.0.2/");
+    const auto changed = m_directory->findByName("CHANGING");
+    ASSERT_TRUE(changed);
+    EXPECT_EQ(changed->web, "https://127.0.0.2/");
 }
 
 TEST_F(DirectoryTest, ASourceThatStartsAgainAtOnceIsSeen) {

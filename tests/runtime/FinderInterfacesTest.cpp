@@ -161,7 +161,9 @@ TEST_F(FinderInterfacesTest, AnInterfaceThatComesLaterIsSearchedAndItsSourcesGoW
     auto late = std::make_unique<Neighbour>("near3", "10.77.3");
     late->responder().answerWith(source("LATE (a)", "late", late->address()));
     ASSERT_TRUE(seesUrl("LATE (a)", "rtsp://10.77.3.2:8554/live"));
-    EXPECT_FALSE(m_directory->findByName("LATE (a)")->local);
+    const auto found = m_directory->findByName("LATE (a)");
+    ASSERT_TRUE(found);
+    EXPECT_FALSE(found->local);
     const auto seen = m_directory->generation();
     late.reset();
     ASSERT_TRUE(m_directory->waitForChange(seen, kDeadline));

@@ -43,7 +43,7 @@ class VideoWindowScreensTest : public WindowFixture {
     }
 
     void moveRight() {
-        screen->move(*screen->findWindow(kTitle), kHalf + 150, 100);
+        screen->move(screen->findWindow(kTitle).value(), kHalf + 150, 100);
         ASSERT_TRUE(runUntil([&] { return view->devicePixelRatioF() == 1.5; }));
     }
 
@@ -74,7 +74,7 @@ TEST_F(VideoWindowScreensTest, ThePictureFillsThePixelsOfTheOtherScreen) {
         };
         EXPECT_TRUE(runUntil([&] { return resized() && fits(); })) << size.width();
     }
-    screen->move(*screen->findWindow(kTitle), 100, 100);
+    screen->move(screen->findWindow(kTitle).value(), 100, 100);
     ASSERT_TRUE(runUntil([&] { return view->devicePixelRatioF() == 1; }));
     EXPECT_TRUE(runUntil([&] { return fits(); }));
 }
@@ -91,7 +91,7 @@ TEST_F(VideoWindowScreensTest, TheLinkFollowsTheRefreshRateOfTheScreenThatTheWin
     leftRate = 30;
     emit left->refreshRateChanged(leftRate);
     EXPECT_EQ(display->rate, kRightRate) << "what happens to the screen that it left is nothing to it";
-    screen->move(*screen->findWindow(kTitle), 100, 100);
+    screen->move(screen->findWindow(kTitle).value(), 100, 100);
     EXPECT_TRUE(runUntil([&] { return display->rate == leftRate; })) << display->rate;
     generation = display->generation;
     leftRate = 75;
@@ -108,7 +108,7 @@ TEST_F(VideoWindowScreensTest, ShortcutsWorkAfterAClickOnTheOtherScreen) {
     showRed(400, 300);
     moveRight();
     ASSERT_TRUE(runUntil([&] { return fits(); }));
-    screen->activate(*screen->findWindow(kTitle));
+    screen->activate(screen->findWindow(kTitle).value());
     const auto area = *picture();
     screen->click(area.x + area.width / 2, area.y + area.height / 2);
     ASSERT_TRUE(runUntil([&] { return view->hasFocus(); }));

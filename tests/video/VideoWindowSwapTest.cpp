@@ -66,14 +66,14 @@ class VideoWindowSwapTest : public WindowFixture {
     }
 
     /// What is set for a drawable as the one that the window has now.
-    Interval expected() const { return {NAMES_DRAWABLE ? picture()->id : 0, 1}; }
+    Interval expected() const { return {NAMES_DRAWABLE ? picture().value().id : 0, 1}; }
 };
 
 TEST_F(VideoWindowSwapTest, SwapsWaitForOneRetraceAlsoOfADrawableThatWasMadeAnew) {
     showRed(640, 360);
     EXPECT_EQ(takeIntervals(), std::vector{expected()});
     for (int i = 0; i < 3; ++i) {
-        const unsigned long before = picture()->id;
+        const unsigned long before = picture().value().id;
         window->makeAnew();
         ASSERT_TRUE(runUntil([&] { return picture() && picture()->id != before; }));
         ASSERT_TRUE(waitForColour(640, 360, 320, 180, kRed));

@@ -54,7 +54,7 @@ TEST_F(VideoWindowTest, FullScreenFillsTheScreenAndKeepsTheShortcuts) {
 TEST_F(VideoWindowTest, ThePictureSurvivesThatTheWindowIsMadeAnew) {
     showRed(640, 360);
     for (int i = 0; i < 3; ++i) {
-        const unsigned long before = screen->findWindow(kTitle)->id;
+        const unsigned long before = screen->findWindow(kTitle).value().id;
         window->makeAnew();
         ASSERT_TRUE(runUntil([&] {
             const auto found = screen->findWindow(kTitle);
@@ -128,7 +128,7 @@ TEST_F(VideoWindowTest, AClickOnThePictureLeavesMenusAndShortcutsAlive) {
     fullScreen->setShortcut(Qt::Key_F11);
     QObject::connect(fullScreen, &QAction::triggered, [&] { ++triggered; });
     show(640, 360);
-    screen->activate(*screen->findWindow(kTitle));
+    screen->activate(screen->findWindow(kTitle).value());
     const auto area = *picture();
     screen->click(area.x + 320, area.y + 180);
     ASSERT_TRUE(runUntil([&] { return view->hasFocus(); }));
