@@ -216,10 +216,18 @@ class SoundOrder : public ReceiverSound {
         const auto receiver = listen(server.url());
         const Recording recording = record(*receiver, 0.4, 0.4);
         ASSERT_EQ(recording.channels, count);
+        std::vector<double> heard;
+        double whole = 0; // of all planes: a gap, which a busy machine may leave, takes as much from each
+        double sent = 0;
         for (std::size_t plane = 0; plane < channels.size(); ++plane) {
-            const double level = levelOf(channels[plane], count);
-            const double nextLevel = 0.5 / count;
-            EXPECT_NEAR(amplitudeAt(recording.planes[plane], recording.rate, kTone), level, 0.3 * nextLevel) << plane;
+            heard.push_back(amplitudeAt(recording.planes[plane], recording.rate, kTone));
+            whole += heard.back();
+            sent += levelOf(channels[plane], count);
+        }
+        ASSERT_GT(whole, 0.3 * sent);
+        const double nextLevel = 0.5 / count;
+        for (std::size_t plane = 0; plane < channels.size(); ++plane) {
+            EXPECT_NEAR(heard[plane] * sent / whole, levelOf(channels[plane], count), 0.3 * nextLevel) << plane;
         }
     }
 };
