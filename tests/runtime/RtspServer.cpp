@@ -1,5 +1,8 @@
 #include "tests/runtime/RtspServer.h"
 
+#include <chrono>
+#include <future>
+#include <memory>
 #include <stdexcept>
 #include <utility>
 
@@ -176,13 +179,48 @@ void RtspServer::addFactory(const std::string& path, const std::string& launch) 
     g_object_unref(mounts);
 }
 
+namespace {
+
+/// Sets a property of a source between two of its buffers, on the thread that makes them: the test picture's source
+/// draws on with what another thread is just taking away.
+void setBetweenBuffers(GstElement* source, const std::string& property, const std::string& value) {
+    struct Change {
+        GstElement* source;
+        std::string property;
+        std::string value;
+        std::promise<void> made;
+    };
+    auto change = std::make_unique<Change>(Change{source, property, value, {}});
+    const std::future<void> made = change->made.get_future();
+    GstPad* pad = gst_element_get_static_pad(source, "src");
+    gst_pad_add_probe(
+        pad, GST_PAD_PROBE_TYPE_BUFFER,
+        [](GstPad*, GstPadProbeInfo*, gpointer data) {
+            auto& asked = *static_cast<Change*>(data);
+            gst_util_set_object_arg(G_OBJECT(asked.source), asked.property.c_str(), asked.value.c_str());
+            asked.made.set_value();
+            return GST_PAD_PROBE_REMOVE;
+        },
+        change.release(), [](gpointer data) { std::default_delete<Change>()(static_cast<Change*>(data)); });
+    gst_object_unref(pad);
+    if (made.wait_for(std::chrono::seconds(10)) != std::future_status::ready) {
+        throw std::runtime_error("the source makes no buffers");
+    }
+}
+
+} // namespace
+
 void RtspServer::set(const std::string& element, const std::string& property, const std::string& value) {
     const std::lock_guard guard(m_mutex);
     GstElement* found = m_pipeline != nullptr ? gst_bin_get_by_name(GST_BIN(m_pipeline), element.c_str()) : nullptr;
     if (found == nullptr) {
         throw std::runtime_error("there is no running element " + element);
     }
-    gst_util_set_object_arg(G_OBJECT(found), property.c_str(), value.c_str());
+    if (GST_OBJECT_FLAG_IS_SET(found, GST_ELEMENT_FLAG_SOURCE)) {
+        setBetweenBuffers(found, property, value);
+    } else {
+        gst_util_set_object_arg(G_OBJECT(found), property.c_str(), value.c_str());
+    }
     gst_object_unref(found);
 }
 
