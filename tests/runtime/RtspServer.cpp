@@ -10,49 +10,71 @@ namespace qivo::test {
 
 /// What the server calls, on its own thread.
 struct RtspServer::Callbacks {
-    static RtspServer& self(gpointer data) { return *static_cast<RtspServer*>(data); }
+    static State& state(gpointer data) { return **static_cast<std::shared_ptr<State>*>(data); }
+
+    /// Calls back with the state for as long as `instance` lives.
+    static void connect(gpointer instance, const char* signal, GCallback callback, std::shared_ptr<State> state) {
+        auto kept = std::make_unique<std::shared_ptr<State>>(std::move(state));
+        g_signal_connect_data(
+            instance, signal, callback, kept.release(),
+            [](gpointer data, GClosure*) {
+                std::default_delete<std::shared_ptr<State>>()(static_cast<std::shared_ptr<State>*>(data));
+            },
+            GConnectFlags());
+    }
 
     static void connected(GstRTSPServer*, GstRTSPClient* client, gpointer data) {
-        ++self(data).m_connections;
-        g_signal_connect(client, "setup-request", G_CALLBACK(setUp), data);
-        g_signal_connect(client, "new-session", G_CALLBACK(newSession), data);
+        const auto& kept = *static_cast<std::shared_ptr<State>*>(data);
+        ++kept->connections;
+        connect(client, "setup-request", G_CALLBACK(setUp), kept);
+        connect(client, "new-session", G_CALLBACK(newSession), kept);
     }
 
     static void newSession(GstRTSPClient*, GstRTSPSession* session, gpointer data) {
-        gst_rtsp_session_set_timeout(session, static_cast<guint>(self(data).m_options.sessionTimeout.count()));
+        gst_rtsp_session_set_timeout(session, static_cast<guint>(state(data).sessionTimeout.count()));
     }
 
     static void setUp(GstRTSPClient*, GstRTSPContext* context, gpointer data) {
-        ++self(data).m_setups;
+        ++state(data).setups;
         gchar* transport = nullptr;
         gst_rtsp_message_get_header(context->request, GST_RTSP_HDR_TRANSPORT, &transport, 0);
         if (transport != nullptr && std::string(transport).find("TCP") != std::string::npos) {
-            ++self(data).m_tcpSetups;
+            ++state(data).tcpSetups;
         }
     }
 
     static void configure(GstRTSPMediaFactory*, GstRTSPMedia* media, gpointer data) {
-        RtspServer& server = self(data);
+        const auto& kept = *static_cast<std::shared_ptr<State>*>(data);
         GstElement* element = gst_rtsp_media_get_element(media);
         for (int i = 0; GstElement* payloader = payloaderOf(element, i); ++i) {
             GstPad* pad = gst_element_get_static_pad(payloader, "src");
             gst_pad_add_probe(pad,
                               static_cast<GstPadProbeType>(GST_PAD_PROBE_TYPE_BUFFER | GST_PAD_PROBE_TYPE_BUFFER_LIST),
-                              send, new Way{server.m_silent, server.m_lossy}, // NOLINT
+                              send, new Way{kept}, // NOLINT
                               [](gpointer way) { std::default_delete<Way>()(static_cast<Way*>(way)); });
             gst_object_unref(pad);
             gst_object_unref(payloader);
         }
-        g_signal_connect(media, "prepared", G_CALLBACK(prepared), data);
-        const std::lock_guard guard(server.m_mutex);
-        if (server.m_pipeline != nullptr) {
-            gst_object_unref(server.m_pipeline);
+        connect(media, "prepared", G_CALLBACK(prepared), kept);
+        keep(*kept, element);
+    }
+
+    /// Takes the reference, in the place of the one to the pipeline before.
+    static void keep(State& state, GstElement* pipeline, bool ends = false) {
+        {
+            const std::lock_guard guard(state.mutex);
+            if (!state.ended) {
+                std::swap(state.pipeline, pipeline);
+            }
+            state.ended = state.ended || ends;
         }
-        server.m_pipeline = element;
+        if (pipeline != nullptr) {
+            gst_object_unref(pipeline);
+        }
     }
 
     static void prepared(GstRTSPMedia* media, gpointer data) {
-        const guint64 interval = std::chrono::nanoseconds(self(data).m_options.reports).count();
+        const guint64 interval = std::chrono::nanoseconds(state(data).reports).count();
         for (guint i = 0; interval > 0 && i < gst_rtsp_media_n_streams(media); ++i) {
             GObject* session = gst_rtsp_stream_get_rtpsession(gst_rtsp_media_get_stream(media, i));
             g_object_set(session, "rtcp-min-interval", interval, nullptr);
@@ -66,22 +88,23 @@ struct RtspServer::Callbacks {
 
     /// Where packets go, or do not.
     struct Way {
-        std::shared_ptr<std::atomic<bool>> silent;
-        std::shared_ptr<std::atomic<unsigned>> lossy;
+        std::shared_ptr<State> state;
         unsigned count = 0;
     };
 
     static GstPadProbeReturn send(GstPad*, GstPadProbeInfo*, gpointer data) {
         auto& way = *static_cast<Way*>(data);
-        const unsigned lossy = *way.lossy;
+        const unsigned lossy = way.state->lossy;
         const bool lost = lossy > 0 && ++way.count % lossy == 0;
-        return *way.silent || lost ? GST_PAD_PROBE_DROP : GST_PAD_PROBE_OK;
+        return way.state->silent || lost ? GST_PAD_PROBE_DROP : GST_PAD_PROBE_OK;
     }
 
     static GstRTSPFilterResult removeClient(GstRTSPServer*, GstRTSPClient*, gpointer) { return GST_RTSP_FILTER_REMOVE; }
 };
 
-RtspServer::RtspServer(Options options) : m_options(std::move(options)) {
+RtspServer::RtspServer(Options options)
+    : m_options(std::move(options)),
+      m_state(std::shared_ptr<State>(new State{m_options.sessionTimeout, m_options.reports})) {
     gst_init(nullptr, nullptr);
     m_context = g_main_context_new();
     m_loop = g_main_loop_new(m_context, FALSE);
@@ -103,7 +126,7 @@ RtspServer::RtspServer(Options options) : m_options(std::move(options)) {
     if (!m_options.lowLaunch.empty()) {
         addFactory(m_options.lowPath, m_options.lowLaunch);
     }
-    g_signal_connect(m_server, "client-connected", G_CALLBACK(Callbacks::connected), this);
+    Callbacks::connect(m_server, "client-connected", G_CALLBACK(Callbacks::connected), m_state);
     if (gst_rtsp_server_attach(m_server, m_context) == 0) {
         throw std::runtime_error("the RTSP server does not start");
     }
@@ -134,9 +157,7 @@ RtspServer::~RtspServer() {
     g_source_attach(quit, m_context);
     g_source_unref(quit);
     m_thread.join();
-    if (m_pipeline != nullptr) {
-        gst_object_unref(m_pipeline);
-    }
+    Callbacks::keep(*m_state, nullptr, true);
     GSource* listener = g_main_context_find_source_by_id(m_context, 1);
     if (listener != nullptr) {
         g_source_destroy(listener);
@@ -174,7 +195,7 @@ void RtspServer::addFactory(const std::string& path, const std::string& launch) 
         gst_rtsp_media_factory_set_permissions(factory, permissions);
         gst_rtsp_permissions_unref(permissions);
     }
-    g_signal_connect(factory, "media-configure", G_CALLBACK(Callbacks::configure), this);
+    Callbacks::connect(factory, "media-configure", G_CALLBACK(Callbacks::configure), m_state);
     gst_rtsp_mount_points_add_factory(mounts, path.c_str(), factory);
     g_object_unref(mounts);
 }
@@ -211,8 +232,9 @@ void setBetweenBuffers(GstElement* source, const std::string& property, const st
 } // namespace
 
 void RtspServer::set(const std::string& element, const std::string& property, const std::string& value) {
-    const std::lock_guard guard(m_mutex);
-    GstElement* found = m_pipeline != nullptr ? gst_bin_get_by_name(GST_BIN(m_pipeline), element.c_str()) : nullptr;
+    const std::lock_guard guard(m_state->mutex);
+    GstElement* found =
+        m_state->pipeline != nullptr ? gst_bin_get_by_name(GST_BIN(m_state->pipeline), element.c_str()) : nullptr;
     if (found == nullptr) {
         throw std::runtime_error("there is no running element " + element);
     }

@@ -43,20 +43,34 @@ class RtspServer {
     std::string url(const std::string& path) const;
 
     /// Whether anything is sent; connections stay open either way.
-    void setSilent(bool silent) { *m_silent = silent; }
+    void setSilent(bool silent) { m_state->silent = silent; }
     /// From now on every n-th buffer of packets is lost; 0 for none.
-    void setLossy(unsigned everyNth) { *m_lossy = everyNth; }
+    void setLossy(unsigned everyNth) { m_state->lossy = everyNth; }
     /// Sets a property of an element of the pipeline that runs.
     void set(const std::string& element, const std::string& property, const std::string& value);
     /// Connections accepted so far.
-    int connections() const { return m_connections; }
+    int connections() const { return m_state->connections; }
     /// Streams set up so far.
-    int setups() const { return m_setups; }
+    int setups() const { return m_state->setups; }
     /// SETUP requests answered so far that chose TCP.
-    int tcpSetups() const { return m_tcpSetups; }
+    int tcpSetups() const { return m_state->tcpSetups; }
 
   private:
     struct Callbacks;
+    /// Shared with connections and pipelines, which end on threads of their own, perhaps after the server.
+    struct State {
+        const std::chrono::seconds sessionTimeout;
+        const std::chrono::milliseconds reports;
+        std::atomic<bool> silent = false;
+        std::atomic<unsigned> lossy = 0;
+        std::atomic<int> connections = 0;
+        std::atomic<int> setups = 0;
+        std::atomic<int> tcpSetups = 0;
+
+        std::mutex mutex = {}; ///< protects the rest
+        bool ended = false;
+        GstElement* pipeline = nullptr; ///< the newest; none once the server has ended, as pipelines hold this
+    };
 
     void addFactory(const std::string& path, const std::string& launch);
 
@@ -66,15 +80,7 @@ class RtspServer {
     GstRTSPServer* m_server = nullptr;
     std::thread m_thread;
     int m_port = 0;
-    /// Shared with the pipelines, which may outlive the server.
-    const std::shared_ptr<std::atomic<bool>> m_silent = std::make_shared<std::atomic<bool>>(false);
-    const std::shared_ptr<std::atomic<unsigned>> m_lossy = std::make_shared<std::atomic<unsigned>>(0);
-    std::atomic<int> m_connections = 0;
-    std::atomic<int> m_setups = 0;
-    std::atomic<int> m_tcpSetups = 0;
-
-    std::mutex m_mutex; // protects the rest
-    GstElement* m_pipeline = nullptr;
+    const std::shared_ptr<State> m_state;
 };
 
 /// A source of test pictures; `caps` as in "width=320,height=240,framerate=30/1".
