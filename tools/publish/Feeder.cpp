@@ -55,12 +55,23 @@ void Feeder::push(Picture picture) {
     if (!clock) {
         return;
     }
-    const GstClockTimeDiff now =
-        GST_CLOCK_DIFF(gst_element_get_base_time(GST_ELEMENT(m_destination.get())), gst_clock_get_time(clock.get()));
+    const GstClockTime base = gst_element_get_base_time(GST_ELEMENT(m_destination.get()));
+    const GstClockTimeDiff now = GST_CLOCK_DIFF(base, gst_clock_get_time(clock.get()));
     const std::chrono::nanoseconds age = std::chrono::steady_clock::now() - picture.taken;
+    const GstClockTimeDiff stamp = std::max<GstClockTimeDiff>(0, now - age.count());
+    // After a pause running time goes on from where it stood.
+    if (base != m_base) {
+        m_base = base;
+        m_last.reset();
+    }
+    // Pictures come one behind the other. Not so those of a time before the pipeline's.
+    if (m_last && stamp <= *m_last) {
+        return;
+    }
+    m_last = stamp;
     // The pool's buffers and those of an input may be shared with another stream; stamps are a stream's own.
     Buffer stamped(gst_buffer_make_writable(picture.buffer.release()));
-    GST_BUFFER_PTS(stamped.get()) = static_cast<GstClockTime>(std::max<GstClockTimeDiff>(0, now - age.count()));
+    GST_BUFFER_PTS(stamped.get()) = static_cast<GstClockTime>(stamp);
     GST_BUFFER_DTS(stamped.get()) = GST_CLOCK_TIME_NONE;
     gst_app_src_push_buffer(m_destination.get(), stamped.release());
 }

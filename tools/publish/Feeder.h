@@ -6,13 +6,14 @@
 #include <gst/app/gstappsrc.h>
 #include <memory>
 #include <mutex>
+#include <optional>
 #include <thread>
 
 namespace qivo {
 
 /** Carries pictures from a source to the live appsrc in front of an encoder, from the appsrc's first demand, which
  * comes when its pipeline plays, until destruction. Stamps them with the pipeline's running time at which they were
- * taken. */
+ * taken; of those that were taken before it played only the first is carried. */
 class Feeder {
   public:
     Feeder(GstAppSrc* destination, std::unique_ptr<PictureSource> source);
@@ -31,8 +32,10 @@ class Feeder {
     std::unique_ptr<PictureSource> m_source;
     std::mutex m_mutex;
     std::condition_variable m_changed;
-    bool m_wanted = false;  // under m_mutex
-    bool m_stopped = false; // under m_mutex
+    GstClockTime m_base = 0;                // the time of the clock when the pipeline's running time was 0
+    std::optional<GstClockTimeDiff> m_last; // since then, the stamp of the last picture
+    bool m_wanted = false;                  // under m_mutex
+    bool m_stopped = false;                 // under m_mutex
     std::thread m_thread;
 };
 
