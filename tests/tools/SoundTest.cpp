@@ -46,7 +46,7 @@ TEST(Tone, hasItsFrequencyAndLevelOnEachChannelWhateverTheRate) {
         const SoundFormat format{rate, 8};
         ToneSource source(format, 3);
         std::vector<float> samples(static_cast<std::size_t>(rate) * 8);
-        source.fill(samples.data(), static_cast<std::size_t>(rate));
+        source.fill(samples.data(), static_cast<std::size_t>(rate), {});
         for (int channel = 0; channel < 8; ++channel) {
             const auto plane = planeOf(samples, 8, channel);
             EXPECT_NEAR(test::frequencyOf(plane, rate), toneFrequency(3, channel), 0.1) << rate << " " << channel;
@@ -62,9 +62,9 @@ TEST(Tone, goesOnWithoutABreakFromFillToFillForAnHour) {
     std::vector<float> second(44100);
     std::vector<float> pieces(44100);
     for (int i = 0; i < 3; ++i) {
-        one.fill(second.data(), second.size());
+        one.fill(second.data(), second.size(), {});
         for (std::size_t at = 0; at < pieces.size(); at += 441) {
-            other.fill(&pieces[at], 441);
+            other.fill(&pieces[at], 441, {});
         }
         EXPECT_EQ(second, pieces);
     }

@@ -28,6 +28,9 @@ constexpr auto busWait = 50ms;
 // A loop shorter than this would only cost processor time.
 constexpr auto shortestLoop = 40ms;
 
+// On a machine that is too slow for a file, what comes is not said to be older than this.
+constexpr auto longestDelay = 250ms;
+
 // What the relayed stream may be late before it is shown, in milliseconds.
 constexpr guint relayLatency = 40;
 
@@ -47,6 +50,20 @@ bool rewind(GstElement* pipeline) {
 
 bool isRecorded(InputKind kind) {
     return kind == InputKind::file || kind == InputKind::stillPicture;
+}
+
+// When what comes out of a sink that keeps to its pipeline's clock was due, however late the thread that brings it is.
+// That clock tells the time of the steady one. A sink that was added while the pipeline started may not know yet when
+// that was.
+Clock::time_point dueTime(GstAppSink* sink, GstSample* sample) {
+    const auto now = Clock::now();
+    const GstClockTime start = gst_element_get_base_time(GST_ELEMENT(sink));
+    const GstClockTime running = gst_segment_to_running_time(gst_sample_get_segment(sample), GST_FORMAT_TIME,
+                                                             GST_BUFFER_PTS(gst_sample_get_buffer(sample)));
+    if (start == 0 || !GST_CLOCK_TIME_IS_VALID(running)) {
+        return now;
+    }
+    return std::clamp(Clock::time_point(std::chrono::nanoseconds(start + running)), now - longestDelay, now);
 }
 
 void onSourceSetup(GstElement*, GstElement* source, gpointer) {
@@ -203,12 +220,15 @@ class InputPictureSource final : public PictureSource {
         if (m_slot.newest.buffer) {
             m_substitute.reset();
             m_patientUntil = Clock::now() + Input::patience;
-            return std::move(m_slot.newest);
+            Picture picture = std::move(m_slot.newest);
+            picture.taken = std::max(picture.taken, m_earliest);
+            return picture;
         }
         lock.unlock();
         if (!m_substitute) {
             m_substitute = std::make_unique<PicturePainter>(m_slot.format, drawTestPicture(m_slot.format, m_look));
         }
+        m_earliest = due + 1ms;
         return {m_substitute->paint(due), due};
     }
 
@@ -227,12 +247,13 @@ class InputPictureSource final : public PictureSource {
     TestPictureLook m_look;
     Pacer m_pacer;
     Clock::time_point m_patientUntil;
+    Clock::time_point m_earliest; // a late picture of a file does not go before one that stood in for it
     std::unique_ptr<PicturePainter> m_substitute; // while there is no picture
     bool m_stopped = false;                       // under the input's m_mutex
 };
 
-/** The sound of a branch, a little late so that it does not stutter: a decoder brings more at a time than is asked for.
- */
+/** The sound of a branch, a little late so that it does not stutter: a decoder brings more at a time than is asked for,
+ *  and not in time where the machine is busy. */
 class InputSoundSource final : public SoundSource {
   public:
     InputSoundSource(std::shared_ptr<Input> input, Input::Branch branch)
@@ -244,13 +265,21 @@ class InputSoundSource final : public SoundSource {
     ~InputSoundSource() override {
         const std::lock_guard lock(m_input->m_mutex);
         --m_slot.listeners;
-        m_slot.sound->clear();
+        if (m_slot.recorded) {
+            m_slot.recorded->clear();
+        } else {
+            m_slot.live->clear();
+        }
     }
 
-    void fill(float* samples, std::size_t count) override {
+    void fill(float* samples, std::size_t count, Time begin) override {
         const auto channels = static_cast<std::size_t>(m_input->m_sound->channels);
         const std::lock_guard lock(m_input->m_mutex);
-        m_slot.sound->take(samples, count * channels);
+        if (m_slot.recorded) {
+            m_slot.recorded->take(samples, count * channels, begin - age());
+        } else {
+            m_slot.live->take(samples, count * channels);
+        }
     }
 
     [[nodiscard]] std::chrono::nanoseconds age() const override { return SoundCushion::held; }
@@ -268,7 +297,11 @@ Input::Input(InputPlace place, const PictureFormat& full, const PictureFormat& l
     m_slots[1].owner = this;
     m_slots[1].format = low;
     for (Slot& slot : m_slots) {
-        slot.sound = sound ? std::optional(SoundCushion(*sound)) : std::nullopt;
+        if (sound && isRecorded(m_place.kind)) {
+            slot.recorded.emplace(*sound);
+        } else if (sound) {
+            slot.live.emplace(*sound);
+        }
     }
 }
 
@@ -404,6 +437,8 @@ Object<GstElement> Input::build() {
     if (!pipeline || error) {
         return nullptr;
     }
+    const Object<GstClock> clock(gst_system_clock_obtain());
+    gst_pipeline_use_clock(GST_PIPELINE(pipeline.get()), clock.get());
     const Object<GstElement> in(gst_bin_get_by_name(GST_BIN(pipeline.get()), "in"));
     if (m_place.kind == InputKind::device) {
         g_object_set(in.get(), "device", m_place.location.c_str(), nullptr);
@@ -485,11 +520,14 @@ GstFlowReturn Input::onSound(GstAppSink* sink, gpointer data) {
         return GST_FLOW_EOS;
     }
     const auto* begin = reinterpret_cast<const float*>(map.data);
+    const auto due = dueTime(sink, sample.get());
     {
         const std::lock_guard lock(input.m_mutex);
         for (Slot& slot : input.m_slots) {
-            if (slot.listeners > 0) {
-                slot.sound->add(begin, map.size / sizeof(float));
+            if (slot.listeners > 0 && slot.recorded) {
+                slot.recorded->add(begin, map.size / sizeof(float), due);
+            } else if (slot.listeners > 0) {
+                slot.live->add(begin, map.size / sizeof(float));
             }
         }
     }
@@ -511,10 +549,12 @@ GstFlowReturn Input::onSample(GstAppSink* sink, gpointer data) {
     if (buffer == nullptr) {
         return GST_FLOW_EOS;
     }
+    const auto now = Clock::now();
+    const auto taken = isRecorded(slot.owner->m_place.kind) ? dueTime(sink, sample.get()) : now;
     {
         const std::lock_guard lock(slot.owner->m_mutex);
-        slot.newest = {Buffer(gst_buffer_ref(buffer)), Clock::now()};
-        slot.owner->m_lastPicture = slot.newest.taken;
+        slot.newest = {Buffer(gst_buffer_ref(buffer)), taken};
+        slot.owner->m_lastPicture = now;
         slot.owner->m_reported.clear();
     }
     slot.owner->m_changed.notify_all();

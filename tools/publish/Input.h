@@ -1,5 +1,6 @@
 #pragma once
 
+#include "tools/publish/DueSound.h"
 #include "tools/publish/NeededElement.h"
 #include "tools/publish/PictureSource.h"
 #include "tools/publish/Sound.h"
@@ -48,7 +49,8 @@ struct InputPlace {
 [[nodiscard]] std::vector<NeededElement> elementsFor(InputKind kind);
 
 /** A file, device or stream, opened while at least one of its two streams is watched: a device can be opened only once.
- *  A file is played in a loop at its own speed; the others are reopened whenever they end or fail. */
+ *  A file is played in a loop at its own speed; the others are reopened whenever they end or fail. What a file brings
+ * was taken when it was due at that speed, in picture and sound alike; what the others bring, when it came. */
 class Input {
   public:
     enum class Branch { full, low };
@@ -82,10 +84,11 @@ class Input {
     struct Slot {
         Input* owner = nullptr;
         PictureFormat format;
-        int watchers = 0;                  // under m_mutex
-        Picture newest;                    // under m_mutex
-        int listeners = 0;                 // under m_mutex
-        std::optional<SoundCushion> sound; // under m_mutex
+        int watchers = 0;                 // under m_mutex
+        Picture newest;                   // under m_mutex
+        int listeners = 0;                // under m_mutex
+        std::optional<DueSound> recorded; // under m_mutex; the sound of a recorded input
+        std::optional<SoundCushion> live; // under m_mutex; and of another
     };
 
     void watched(Branch branch);

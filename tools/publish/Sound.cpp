@@ -90,7 +90,7 @@ int toneFrequency(std::size_t source, int channel) {
            number / betweenNeighbours;
 }
 
-void ToneSource::fill(float* samples, std::size_t count) {
+void ToneSource::fill(float* samples, std::size_t count, Time /*begin*/) {
     const double turn = 2.0 * std::acos(-1.0);
     for (std::size_t i = 0; i < count; ++i) {
         for (int channel = 0; channel < m_format.channels; ++channel) {

@@ -26,12 +26,15 @@ struct SoundFormat {
 /** What a stream lets be heard. Used by one thread. */
 class SoundSource {
   public:
+    using Time = std::chrono::steady_clock::time_point;
+
     virtual ~SoundSource() = default;
 
-    /** The next samples, `count` in each channel. Does not wait; where there is nothing it is silence. */
-    virtual void fill(float* samples, std::size_t count) = 0;
+    /** The next samples, `count` in each channel, for the time from `begin` on, which is the end of the last ones
+     * unless some were missed. Does not wait; where there is nothing it is silence. */
+    virtual void fill(float* samples, std::size_t count, Time begin) = 0;
 
-    /** How long ago what fill() brings was taken, at least. */
+    /** How long before their `begin` what fill() brings was taken; about, where the source cannot know. */
     [[nodiscard]] virtual std::chrono::nanoseconds age() const { return {}; }
 };
 
@@ -49,7 +52,7 @@ class ToneSource final : public SoundSource {
   public:
     ToneSource(SoundFormat format, std::size_t source) : m_format(format), m_source(source) {}
 
-    void fill(float* samples, std::size_t count) override;
+    void fill(float* samples, std::size_t count, Time begin) override;
 
   private:
     SoundFormat m_format;

@@ -78,7 +78,7 @@ void SoundFeeder::push(std::size_t count, Time taken) {
     if (!buffer || gst_buffer_map(buffer.get(), &map, GST_MAP_WRITE) == FALSE) {
         return;
     }
-    m_source->fill(reinterpret_cast<float*>(map.data), count);
+    m_source->fill(reinterpret_cast<float*>(map.data), count, taken);
     gst_buffer_unmap(buffer.get(), &map);
     if (!clock) {
         return;
