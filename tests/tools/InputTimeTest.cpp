@@ -82,7 +82,7 @@ TEST_F(InputTime, pictureAndSoundOfAFileAreTogetherInEveryRound) {
     std::vector<Clock::time_point> heard;
     bool wasBright = false;
     bool wasLoud = false;
-    while (seen.size() < 4 || heard.size() < 4) {
+    while (seen.size() < 4 || heard.empty() || heard.back() < seen[3] - 100ms) {
         ASSERT_LE(seen.size(), 8U) << "no sound";
         const Picture picture = pictures->next();
         ASSERT_TRUE(picture.buffer);
@@ -101,8 +101,13 @@ TEST_F(InputTime, pictureAndSoundOfAFileAreTogetherInEveryRound) {
             wasLoud = loud != block.end();
         }
     }
-    for (std::size_t round = 0; round < 4; ++round) {
-        const std::chrono::duration<double, std::milli> after = heard[round] - seen[round];
+    // The first round may have begun without anybody who listened.
+    for (std::size_t round = 1; round < 4; ++round) {
+        std::chrono::duration<double, std::milli> after = 1h;
+        for (const auto time : heard) {
+            const std::chrono::duration<double, std::milli> here = time - seen[round];
+            after = std::abs(here.count()) < std::abs(after.count()) ? here : after;
+        }
         // A file of this kind tells times in whole milliseconds.
         EXPECT_NEAR(after.count(), 0, 1.5) << round;
     }
