@@ -1,7 +1,11 @@
+add_library(qivo_stopwatch STATIC Stopwatch.cpp Stopwatch.h)
+target_link_libraries(qivo_stopwatch PRIVATE qivo_options)
+
 add_library(qivo_receiver_fixture STATIC CountingAllocator.cpp CountingAllocator.h
                                          ReceiverFixture.cpp ReceiverFixture.h RtspServer.cpp RtspServer.h
                                          RawServer.cpp RawServer.h RtpPackets.h)
-target_link_libraries(qivo_receiver_fixture PUBLIC qivo_runtime PkgConfig::GSTRTSPSERVER GTest::gtest)
+target_link_libraries(qivo_receiver_fixture PUBLIC qivo_runtime qivo_stopwatch PkgConfig::GSTRTSPSERVER
+                                                   GTest::gtest)
 
 qivo_test(receiver-streams SOURCES ReceiverStreamTest.cpp LIBRARIES qivo_receiver_fixture NETWORK BUSY
           SHARES 2 ENVIRONMENT ${unwind})
