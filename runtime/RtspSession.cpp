@@ -3,6 +3,7 @@
 #include "runtime/GstChain.h"
 #include "runtime/Log.h"
 #include "runtime/LogOnce.h"
+#include "runtime/PictureConverter.h"
 #include "runtime/SamplePicture.h"
 #include "runtime/SoundCodec.h"
 
@@ -119,7 +120,7 @@ GstElement* makeQueue() {
 }
 
 GstElement* makeConverter() {
-    GstElement* converter = makeElement("videoconvert");
+    GstElement* converter = makePictureConverter();
     if (converter != nullptr) {
         g_object_set(converter, "n-threads", kConversionThreads, "qos", FALSE, nullptr);
         gst_util_set_object_arg(G_OBJECT(converter), "dither", "none");

@@ -16,6 +16,7 @@ qivo_test(receiver-healing SOURCES ReceiverHealingTest.cpp LIBRARIES qivo_receiv
 qivo_test(sound-parts SOURCES ChannelOrderTest.cpp SoundQueueTest.cpp LIBRARIES qivo_runtime TSAN)
 qivo_test(receiver-sound SOURCES ReceiverSoundTest.cpp LIBRARIES qivo_receiver_fixture qivo_test_tone NETWORK BUSY
           SHARES 3 ENVIRONMENT ${unwind} TIMEOUT 120)
+qivo_test(picture-converter SOURCES PictureConverterTest.cpp LIBRARIES qivo_runtime ENVIRONMENT ${unwind})
 qivo_test(receiver-parts SOURCES ReceiverPartsTest.cpp LIBRARIES qivo_runtime TSAN)
 
 # Through the library itself, which brings its own copy of everything that it is made of.

@@ -1,0 +1,6 @@
+# From a decoder's planes to RGBA. Run build/release/bench/bench-conversion.
+if(TARGET qivo_runtime)
+    add_executable(bench-conversion Conversion.cpp)
+    target_link_libraries(bench-conversion PRIVATE qivo_runtime qivo_options)
+    set_target_properties(bench-conversion PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/bench)
+endif()
