@@ -6,6 +6,7 @@
 #include "runtime/RgbaRow.h"
 
 #include <algorithm>
+#include <cstddef>
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>

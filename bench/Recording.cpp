@@ -1,5 +1,6 @@
 // Publishes, shows and records one live source at a time, and reads the clock in every picture of the movie.
 #include "bench/ProcessorTime.h"
+#include "bench/Witness.h"
 #include "tests/platform/TemporaryDirectory.h"
 #include "tests/record/MovieReader.h"
 #include "tests/support/Process.h"
@@ -12,7 +13,9 @@
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
+#include <iterator>
 #include <sched.h>
+#include <set>
 #include <thread>
 #include <unistd.h>
 
@@ -65,29 +68,35 @@ std::string told(const std::string& output, const std::string& what) {
                                output.find_first_of(" \n", place + what.size() + 1) - place - what.size() - 1);
 }
 
-/// Whether all pictures that were due are in the movie.
-bool judge(const qivo::test::DecodedMovie& movie, const std::string& dropped) {
+/// Whether all pictures that were published meanwhile are in the movie.
+bool judge(const qivo::test::DecodedMovie& movie, const std::set<std::int64_t>& published, const std::string& dropped) {
     std::size_t unreadable = 0;
-    std::int64_t first = 0;
-    std::int64_t last = 0;
-    std::int64_t longest = 0;
+    std::size_t misplaced = 0; // twice, or behind a later one
+    std::set<std::int64_t> recorded;
     for (const auto& picture : movie.pictures) {
-        unreadable += picture.published ? 0 : 1;
-        if (picture.published) {
-            longest = last == 0 ? 0 : std::max(longest, *picture.published - last);
-            first = first == 0 ? *picture.published : first;
-            last = *picture.published;
+        if (!picture.published) {
+            ++unreadable;
+        } else if (!recorded.empty() && *picture.published <= *recorded.rbegin()) {
+            ++misplaced;
+        } else {
+            recorded.insert(*picture.published);
         }
     }
-    const long due = std::lround(static_cast<double>(last - first) * kRate * 1e-3) + 1;
-    const long missing = due - static_cast<long>(movie.pictures.size());
-    std::printf("pictures published while recording   %ld\n", due);
-    std::printf("pictures recorded                    %zu, with a clock that cannot be read %zu\n",
-                movie.pictures.size(), unreadable);
-    std::printf("missing                              %ld, longest step %lld ms\n", missing,
+    std::int64_t longest = 0;
+    for (auto i = recorded.begin(); i != recorded.end() && std::next(i) != recorded.end(); ++i) {
+        longest = std::max(longest, *std::next(i) - *i);
+    }
+    const long due = recorded.empty()
+                         ? 0
+                         : std::lround(static_cast<double>(*recorded.rbegin() - *recorded.begin()) * kRate * 1e-3) + 1;
+    const Share share = shareOf(recorded, published);
+    std::printf("pictures published while recording   %zu, due %ld\n", share.published, due);
+    std::printf("pictures recorded                    %zu, with a clock that cannot be read %zu, misplaced %zu\n",
+                movie.pictures.size(), unreadable, misplaced);
+    std::printf("missing                              %zu, longest step %lld ms\n", share.published - share.shown,
                 static_cast<long long>(longest));
     std::printf("dropped, as the recorder tells       %s\n", dropped.c_str());
-    return movie.readable && missing == 0 && unreadable == 0;
+    return movie.readable && share.published > 0 && share.shown == share.published && unreadable == 0 && misplaced == 0;
 }
 
 /// The end of a recording of a day: the index of its pictures and sound, against a copy of as many bytes.
@@ -140,6 +149,12 @@ int main(int argc, char** argv) {
         return 1;
     }
     std::this_thread::sleep_for(seconds(3));
+    const std::string address = publisher->output().substr(0, publisher->output().find_first_of(" \t\n"));
+    const auto witness = Witness::start(address);
+    if (!witness) {
+        std::fputs("bench-recording: nothing comes from the source\n", stderr);
+        return 1;
+    }
     const qivo::TemporaryDirectory folder;
     const auto recorder =
         Process::start({RECORDER, "-i", kSource, "-o", folder.path("movie.mov"), "-orvane", "-nothumbnail"});
@@ -158,10 +173,12 @@ int main(int argc, char** argv) {
     recorder->signal(SIGINT);
     const auto code = recorder->wait(seconds(30));
     const double endingMs = duration<double, std::milli>(steady_clock::now() - ending).count();
+    const auto published = witness->end();
     viewer->signal(SIGTERM);
     publisher->signal(SIGTERM);
     std::printf("%s", recorder->errors().c_str());
-    const bool whole = judge(qivo::test::decodeMovie(folder.path("movie.mov")), told(recorder->output(), "dropped"));
+    const bool whole =
+        judge(qivo::test::decodeMovie(folder.path("movie.mov")), published, told(recorder->output(), "dropped"));
     std::printf("processor time                       recorder %.0f %%, viewer %.0f %% of one\n", used, viewerUsed);
     std::printf("ended within                         %.0f ms\n", endingMs);
     return whole && code == 0 ? 0 : 1;
