@@ -119,7 +119,7 @@ std::optional<steady_clock::time_point> chooseInMenu(Screen& screen) {
     steady_clock::time_point chosen;
     const bool done = eventually([&] {
         screen.key("Alt+s");
-        screen.key("Right");
+        screen.key("Return"); // arrows would lead to the next menu while there is no source yet
         chosen = steady_clock::now();
         screen.key("Return");
         if (eventually([&] { return screen.findWindow("BENCH (Live)").has_value(); }, milliseconds(300))) {

@@ -52,7 +52,7 @@ bool show(Screen& screen) {
     }
     screen.activate(*screen.findWindow("QIVO Viewer"));
     return eventually([&] {
-        for (const char* key : {"Escape", "Escape", "Alt+s", "Right", "Return"}) {
+        for (const char* key : {"Escape", "Escape", "Alt+s", "Return", "Return"}) {
             screen.key(key);
         }
         return eventually([&] { return screen.findWindow(kSource).has_value(); }, milliseconds(700));
