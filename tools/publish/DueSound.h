@@ -11,8 +11,8 @@
 namespace qivo {
 
 /** Sound that is due at known moments, between one who brings it in pieces, each when its first sample is due or later,
- *  and one who takes it a little after that, by the same clock. How large the pieces are and how late they come does
- *  not move it. Threads must take turns. */
+ *  and one who takes it a little after that, by the same clock. How large the pieces are does not move
+ *  it, nor how late they come as long as they come before they are taken. Threads must take turns. */
 class DueSound {
   public:
     using Time = std::chrono::steady_clock::time_point;
