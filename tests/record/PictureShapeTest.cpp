@@ -1,7 +1,6 @@
 #include "tools/record/PictureShape.h"
 #include "tools/record/EncoderChoice.h"
-
-#include "tools/record/PictureFitter.h"
+#include "tools/record/Handles.h"
 
 #include <cmath>
 #include <gmock/gmock.h>
@@ -136,16 +135,6 @@ TEST(EncoderChoice, EveryElementTakesItsProperties) {
         }
     }
     EXPECT_GE(parsed, 3);
-}
-
-TEST(PictureFitter, NoMoreThanPartOfASecondWaitsForTheEncoder) {
-    EXPECT_EQ(PictureFitter::mostWaiting({160, 90, 1, 1, 30, 1}), 12U);
-    EXPECT_EQ(PictureFitter::mostWaiting({1920, 1080, 1, 1, 30, 1}), 12U);
-    EXPECT_EQ(PictureFitter::mostWaiting({1920, 1080, 1, 1, 60000, 1001}), 24U);
-    EXPECT_EQ(PictureFitter::mostWaiting({3840, 2160, 1, 1, 60, 1}), 8U) << "as many as the memory holds";
-    EXPECT_EQ(PictureFitter::mostWaiting({320, 180, 1, 1, 1000, 1}), 24U);
-    EXPECT_EQ(PictureFitter::mostWaiting({320, 180, 1, 1, 1, 1}), 6U);
-    EXPECT_EQ(PictureFitter::mostWaiting({8192, 8192, 1, 1, 30, 1}), 6U);
 }
 
 } // namespace

@@ -26,6 +26,13 @@ GstVideoInfo movieFormat(const PictureShape& shape) {
     return info;
 }
 
+PlanarColours coloursFor(const GstVideoInfo& info) {
+    double red = 0;
+    double blue = 0;
+    gst_video_color_matrix_get_Kr_Kb(info.colorimetry.matrix, &red, &blue);
+    return PlanarColours::of(red, blue);
+}
+
 Media<GstBufferPool> poolFor(const GstVideoInfo& info, std::size_t most) {
     const std::size_t size = GST_VIDEO_INFO_SIZE(&info);
     Media<GstBufferPool> pool(gst_buffer_pool_new());
@@ -41,11 +48,33 @@ Media<GstBufferPool> poolFor(const GstVideoInfo& info, std::size_t most) {
 } // namespace
 
 PictureFitter::PictureFitter(const PictureShape& shape)
-    : m_shape(shape), m_format(movieFormat(shape)), m_pool(poolFor(m_format, mostWaiting(shape))) {}
+    : m_shape(shape), m_format(movieFormat(shape)), m_colours(coloursFor(m_format)),
+      m_pool(poolFor(m_format, mostWaiting(shape))) {}
 
 PictureFitter::~PictureFitter() {
     if (m_pool) {
         gst_buffer_pool_set_active(m_pool.get(), FALSE);
+    }
+}
+
+/// Whether only the colours are to be converted, in a way that this processor has a fast one for.
+bool PictureFitter::fits(const QIVOlib_video_frame_v2_t& frame) const {
+    return frame.xres == m_shape.width && frame.yres == m_shape.height &&
+           areaFor(aspectOf(frame), m_shape) == PictureArea{0, 0, m_shape.width, m_shape.height} && hasPlanarRows();
+}
+
+void PictureFitter::convertColours(const QIVOlib_video_frame_v2_t& frame, GstVideoFrame& out) const {
+    const auto row = [&out](int component, std::ptrdiff_t y) {
+        return static_cast<std::uint8_t*>(GST_VIDEO_FRAME_COMP_DATA(&out, component)) +
+               y * GST_VIDEO_FRAME_COMP_STRIDE(&out, component);
+    };
+    for (std::ptrdiff_t y = 0; y < frame.yres; y += 2) {
+        const std::ptrdiff_t next = std::min<std::ptrdiff_t>(y + 1, frame.yres - 1);
+        planarRows(m_colours, frame.p_data + y * frame.line_stride_in_bytes,
+                   frame.p_data + next * frame.line_stride_in_bytes,
+                   {row(GST_VIDEO_COMP_Y, y), row(GST_VIDEO_COMP_Y, next), row(GST_VIDEO_COMP_U, y / 2),
+                    row(GST_VIDEO_COMP_V, y / 2)},
+                   frame.xres);
     }
 }
 
@@ -87,8 +116,27 @@ bool PictureFitter::isReadable(const QIVOlib_video_frame_v2_t& frame) {
            frame.line_stride_in_bytes / 4 >= frame.xres;
 }
 
+bool PictureFitter::convert(const QIVOlib_video_frame_v2_t& frame, GstVideoFrame& out) {
+    if (fits(frame)) {
+        convertColours(frame, out);
+        return true;
+    }
+    if (!prepare(frame)) {
+        return false;
+    }
+    const Media<GstBuffer> received(gst_buffer_new_wrapped_full(
+        GST_MEMORY_FLAG_READONLY, frame.p_data, m_inputFormat.size, 0, m_inputFormat.size, nullptr, nullptr));
+    GstVideoFrame in;
+    if (!gst_video_frame_map(&in, &m_inputFormat, received.get(), GST_MAP_READ)) {
+        return false;
+    }
+    gst_video_converter_frame(m_converter.get(), &in, &out);
+    gst_video_frame_unmap(&in);
+    return true;
+}
+
 Media<GstBuffer> PictureFitter::fit(const QIVOlib_video_frame_v2_t& frame) {
-    if (!isReadable(frame) || !m_pool || !prepare(frame)) {
+    if (!isReadable(frame) || !m_pool) {
         return nullptr;
     }
     GstBufferPoolAcquireParams parameters{};
@@ -98,20 +146,13 @@ Media<GstBuffer> PictureFitter::fit(const QIVOlib_video_frame_v2_t& frame) {
         return nullptr;
     }
     Media<GstBuffer> picture(taken);
-    const Media<GstBuffer> received(gst_buffer_new_wrapped_full(
-        GST_MEMORY_FLAG_READONLY, frame.p_data, m_inputFormat.size, 0, m_inputFormat.size, nullptr, nullptr));
-    GstVideoFrame in;
     GstVideoFrame out;
-    if (!gst_video_frame_map(&in, &m_inputFormat, received.get(), GST_MAP_READ)) {
+    if (!gst_video_frame_map(&out, &m_format, picture.get(), GST_MAP_WRITE)) {
         return nullptr;
     }
-    const bool mapped = gst_video_frame_map(&out, &m_format, picture.get(), GST_MAP_WRITE);
-    if (mapped) {
-        gst_video_converter_frame(m_converter.get(), &in, &out);
-        gst_video_frame_unmap(&out);
-    }
-    gst_video_frame_unmap(&in);
-    return mapped ? std::move(picture) : nullptr;
+    const bool converted = convert(frame, out);
+    gst_video_frame_unmap(&out);
+    return converted ? std::move(picture) : nullptr;
 }
 
 } // namespace qivo::record

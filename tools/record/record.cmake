@@ -18,6 +18,7 @@ add_library(qivo_record STATIC
     record/PictureEncoder.cpp
     record/PictureFitter.cpp
     record/PictureShape.cpp
+    record/PlanarRows.cpp
     record/Progress.cpp
     record/Reception.cpp
     record/Recorder.cpp
@@ -25,6 +26,9 @@ add_library(qivo_record STATIC
     record/SourceClock.cpp
     record/Surroundings.cpp)
 target_link_libraries(qivo_record PUBLIC qivo_movie qivo_interface PkgConfig::GSTREAMER PRIVATE qivo_options)
+
+# Live pictures go through it: while one is converted, unoptimised, others come and are lost.
+set_source_files_properties(record/PlanarRows.cpp PROPERTIES COMPILE_OPTIONS -O2)
 
 add_executable(qivo-record record/main.cpp)
 set_target_properties(qivo-record PROPERTIES OUTPUT_NAME Application.Mac.QIVO.Recording)
