@@ -340,6 +340,108 @@ TEST_F(MailboxTest, NewestPictureWins) {
     EXPECT_EQ(capture(), QIVOlib_frame_type_none);
 }
 
+TEST_F(MailboxTest, WhoKeepsUpIsGivenTwoThatCameTogether) {
+    bool inTime = false;
+    for (int i = 0; i < 50 && !inTime; ++i) { // a machine that stands still makes anybody late
+        m_mailbox.dropWaiting();
+        const auto looked = Mailbox::Clock::now();
+        ASSERT_EQ(capture(), QIVOlib_frame_type_none);
+        make(1);
+        make(2);
+        make(3);
+        EXPECT_EQ(m_mailbox.waiting().video_frames, 2);
+        ASSERT_EQ(capture(), QIVOlib_frame_type_video);
+        inTime = Mailbox::Clock::now() - looked <= Mailbox::kLooksOften;
+        m_mailbox.giveBack(m_record.p_data);
+    }
+    EXPECT_EQ(m_record.xres, 2) << "not the one before the newest";
+    ASSERT_EQ(capture(), QIVOlib_frame_type_video);
+    EXPECT_EQ(m_record.xres, 3);
+    EXPECT_EQ(capture(), QIVOlib_frame_type_none);
+}
+
+TEST_F(MailboxTest, WhoWaitedForAPictureKeepsUp) {
+    std::thread maker([this] {
+        std::this_thread::sleep_for(Mailbox::kCatchesUp + 20ms);
+        make(1);
+    });
+    ASSERT_EQ(capture(10s), QIVOlib_frame_type_video);
+    maker.join();
+    make(2);
+    make(3);
+    EXPECT_EQ(m_mailbox.waiting().video_frames, 2);
+    const auto captured = Mailbox::Clock::now();
+    ASSERT_EQ(capture(), QIVOlib_frame_type_video);
+    const bool late = Mailbox::Clock::now() - captured > Mailbox::kLooksOften;
+    EXPECT_TRUE(m_record.xres == 2 || late) << "the time that it waited counts as its own";
+}
+
+TEST_F(MailboxTest, CaptureEndsNoPicture) {
+    ASSERT_EQ(capture(), QIVOlib_frame_type_none);
+    make(1);
+    make(2);
+    std::this_thread::sleep_for(Mailbox::kLooksOften + 1ms);
+    ASSERT_EQ(capture(), QIVOlib_frame_type_video);
+    EXPECT_EQ(m_record.xres, 2);
+    EXPECT_EQ(g_pictures, 2) << "it took the time to end the one that it was too late for";
+    m_mailbox.makeRoom();
+    EXPECT_EQ(g_pictures, 1);
+    m_mailbox.abandon();
+}
+
+TEST_F(MailboxTest, WhoComesLateIsGivenTheNewest) {
+    ASSERT_EQ(capture(), QIVOlib_frame_type_none);
+    make(1);
+    make(2);
+    std::this_thread::sleep_for(Mailbox::kLooksOften + 1ms);
+    ASSERT_EQ(capture(), QIVOlib_frame_type_video);
+    EXPECT_EQ(m_record.xres, 2);
+    EXPECT_EQ(capture(), QIVOlib_frame_type_none);
+}
+
+TEST_F(MailboxTest, WhoNeverFindsNoneIsGivenTheNewest) {
+    ASSERT_EQ(capture(), QIVOlib_frame_type_none);
+    const auto foundNone = Mailbox::Clock::now();
+    int number = 0;
+    bool caughtUp = true;
+    while (caughtUp) {
+        caughtUp = Mailbox::Clock::now() - foundNone <= Mailbox::kCatchesUp;
+        make(++number);
+        make(++number);
+        std::this_thread::sleep_for(10ms);
+        ASSERT_EQ(capture(), QIVOlib_frame_type_video);
+        m_mailbox.giveBack(m_record.p_data);
+    }
+    EXPECT_EQ(m_record.xres, number) << "the delay stays";
+    EXPECT_EQ(capture(), QIVOlib_frame_type_none) << "one was kept that is too late";
+}
+
+TEST_F(MailboxTest, PictureBeingMadeTakesThePlaceOfTheOneBefore) {
+    for (int i = 0; i < 2; ++i) {
+        ASSERT_EQ(capture(), QIVOlib_frame_type_none);
+        make(i);
+        ASSERT_EQ(capture(), QIVOlib_frame_type_video);
+    }
+    ASSERT_EQ(capture(), QIVOlib_frame_type_none);
+    make(8);
+    make(9);
+    m_mailbox.makeRoom();
+    EXPECT_EQ(m_mailbox.waiting().video_frames, 1);
+    m_mailbox.abandon();
+    ASSERT_EQ(capture(), QIVOlib_frame_type_video);
+    EXPECT_EQ(m_record.xres, 9);
+    EXPECT_LE(g_mostPictures, static_cast<int>(Mailbox::kPictures));
+}
+
+TEST_F(MailboxTest, PicturesOfAConnectionThatEndedAreDropped) {
+    ASSERT_EQ(capture(), QIVOlib_frame_type_none);
+    make(1);
+    make(2);
+    m_mailbox.dropWaiting();
+    EXPECT_EQ(g_pictures, 0);
+    EXPECT_EQ(capture(), QIVOlib_frame_type_none);
+}
+
 TEST_F(MailboxTest, StatusChangeComesFirstAndSeveralAreOne) {
     make(1);
     m_mailbox.raiseStatus();

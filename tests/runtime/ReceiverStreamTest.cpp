@@ -211,12 +211,14 @@ TEST_F(ReceiverStreams, QueueTellsWhetherAPictureWaits) {
     const RtspServer server({.launch = h264("width=320,height=240,framerate=5/1")});
     const auto receiver = receive(server.url());
     ASSERT_TRUE(nextPicture(*receiver));
+    while (nextPicture(*receiver, 0ms)) { // the first two may have come at once
+    }
     EXPECT_EQ(receiver->queue().video_frames, 0);
     const auto deadline = Clock::now() + 5s;
     while (receiver->queue().video_frames == 0 && Clock::now() < deadline) {
         std::this_thread::sleep_for(1ms);
     }
-    EXPECT_EQ(receiver->queue().video_frames, 1);
+    EXPECT_GE(receiver->queue().video_frames, 1);
     EXPECT_EQ(receiver->queue().audio_frames, 0);
 }
 
