@@ -1,6 +1,7 @@
 // Shows the same live source with several programs, one after another, and reads the clock in its picture back from the
 // screen. Nothing is taken from the programs' own words: a picture counts when its time code is seen on the screen.
 #include "bench/ProcessorTime.h"
+#include "bench/Stalls.h"
 #include "bench/Witness.h"
 #include "tests/support/Process.h"
 #include "tests/support/Screen.h"
@@ -44,7 +45,9 @@ struct Result {
     bool shown = false;
     double firstPictureMs = 0; // this and the next: the median of several starts
     double firstPictureFromChoiceMs = 0;
-    Share pictures; // shown of those published
+    Share pictures;              // shown of those published
+    Share picturesBetweenStalls; // the same, without those that came while the machine stood still
+    std::size_t stalls = 0;
     double picturesPerSecond = 0;
     double latencyMs = 0;
     double latency95Ms = 0;
@@ -142,6 +145,7 @@ bool watch(const Screen& screen, const Window& view, pid_t pid, const std::strin
     }
     std::set<std::int64_t> pictures;
     std::vector<double> latencies;
+    Stalls stalls;
     const pid_t server = screen.serverProcess();
     const double processorBefore = processorSeconds(pid);
     const double serverBefore = processorSeconds(server);
@@ -159,7 +163,12 @@ bool watch(const Screen& screen, const Window& view, pid_t pid, const std::strin
     result.picturesPerSecond = static_cast<double>(pictures.size()) / elapsed;
     result.latencyMs = percentile(latencies, 0.5);
     result.latency95Ms = percentile(latencies, 0.95);
-    result.pictures = shareOf(pictures, witness->end());
+    stalls.stop();
+    const auto published = witness->end();
+    result.pictures = shareOf(pictures, published);
+    result.picturesBetweenStalls =
+        shareOf(pictures, published, [&stalls](std::int64_t picture) { return !stalls.cover(picture); });
+    result.stalls = stalls.count();
     if (result.pictures.published == 0) {
         std::fputs("nothing shown is known to the witness\n", stderr);
     }
@@ -261,19 +270,21 @@ std::vector<Player> players(const std::string& url) {
 }
 
 void print(const std::vector<Result>& results) {
-    std::printf("%-24s %-3s %12s %9s %13s %13s %11s %10s %11s %9s\n", "", "GL", "shown of", "shown/s", "first from",
-                "first from", "latency", "latency", "processor", "X server");
-    std::printf("%-24s %-3s %12s %9s %13s %13s %11s %10s %11s %9s\n", "", "", "published", "", "start, ms",
-                "choice, ms", "median, ms", "95 %, ms", "% of a core", "%");
+    std::printf("%-24s %-3s %12s %14s %9s %13s %13s %11s %10s %11s %9s\n", "", "GL", "shown of", "between", "shown/s",
+                "first from", "first from", "latency", "latency", "processor", "X server");
+    std::printf("%-24s %-3s %12s %14s %9s %13s %13s %11s %10s %11s %9s\n", "", "", "published", "stalls", "",
+                "start, ms", "choice, ms", "median, ms", "95 %, ms", "% of a core", "%");
     for (const auto& result : results) {
         if (!result.shown) {
             std::printf("%-24s not measured\n", result.name.c_str());
             continue;
         }
-        std::printf("%-24s %-3s %5zu of %4zu %9.2f %13.0f %13.0f %11.0f %10.0f %11.1f %9.1f\n", result.name.c_str(),
-                    result.drawsWithOpenGl ? "yes" : "no", result.pictures.shown, result.pictures.published,
-                    result.picturesPerSecond, result.firstPictureMs, result.firstPictureFromChoiceMs, result.latencyMs,
-                    result.latency95Ms, result.processorPercent, result.serverPercent);
+        std::printf("%-24s %-3s %4zu of %4zu %6zu of %4zu %9.2f %13.0f %13.0f %11.0f %10.0f %11.1f %9.1f\n",
+                    result.name.c_str(), result.drawsWithOpenGl ? "yes" : "no", result.pictures.shown,
+                    result.pictures.published, result.picturesBetweenStalls.shown,
+                    result.picturesBetweenStalls.published, result.picturesPerSecond, result.firstPictureMs,
+                    result.firstPictureFromChoiceMs, result.latencyMs, result.latency95Ms, result.processorPercent,
+                    result.serverPercent);
     }
 }
 
@@ -291,6 +302,7 @@ void printRatios(const std::vector<Result>& results) {
         return found;
     };
     const auto shown = [](const Result& r) { return r.pictures.fraction(); };
+    const auto between = [](const Result& r) { return r.picturesBetweenStalls.fraction(); };
     const auto first = [](const Result& r) { return r.firstPictureFromChoiceMs; };
     const auto firstFromStart = [](const Result& r) { return r.firstPictureMs; };
     const auto latency = [](const Result& r) { return r.latencyMs; };
@@ -299,6 +311,8 @@ void printRatios(const std::vector<Result>& results) {
     std::printf("\nThis viewer against the best of the others:\n");
     std::printf("  pictures shown      %.3f of those published (the best other: %.3f)\n", shown(own),
                 best(shown, false, true));
+    std::printf("                      %.3f without those that came while the machine stood still, %zu times (%.3f)\n",
+                between(own), own.stalls, best(between, false, true));
     std::printf("  first picture       %.2f times the best (from the choice; the others from their start)\n",
                 first(own) / best(first, false, false));
     std::printf("                      %.2f times the best (all from the start of the program)\n",

@@ -10,7 +10,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <filesystem>
-#include <iterator>
 #include <memory>
 #include <set>
 #include <string>
@@ -68,7 +67,9 @@ struct Share {
     double fraction() const { return published == 0 ? 0 : static_cast<double>(shown) / static_cast<double>(published); }
 };
 
-inline Share shareOf(std::set<std::int64_t> shown, std::set<std::int64_t> published) {
+/// Of pictures for which `counts` is true.
+template <typename Counts>
+Share shareOf(std::set<std::int64_t> shown, std::set<std::int64_t> published, Counts counts) {
     if (published.empty()) {
         return {};
     }
@@ -79,7 +80,16 @@ inline Share shareOf(std::set<std::int64_t> shown, std::set<std::int64_t> publis
     }
     // The witness may have missed one as well.
     published.insert(shown.begin(), shown.end());
-    const auto from = published.find(*shown.begin());
-    const auto to = published.upper_bound(*shown.rbegin());
-    return {static_cast<std::size_t>(std::distance(from, to)), shown.size()};
+    Share share;
+    for (auto picture = published.find(*shown.begin()); picture != published.upper_bound(*shown.rbegin()); ++picture) {
+        if (counts(*picture)) {
+            ++share.published;
+            share.shown += shown.count(*picture);
+        }
+    }
+    return share;
+}
+
+inline Share shareOf(const std::set<std::int64_t>& shown, const std::set<std::int64_t>& published) {
+    return shareOf(shown, published, [](std::int64_t) { return true; });
 }
