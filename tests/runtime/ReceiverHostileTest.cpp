@@ -408,9 +408,9 @@ class HostileServer : public ReceiverFixture {};
 
 TEST_F(HostileServer, ThatDoesNotAnswerKeepAlivesIsReceivedAsLongAsItSends) {
     const RtspServer good({.launch = h264("width=320,height=240,framerate=30/1"), .sessionTimeout = 2s});
-    RawServer deaf;
-    std::atomic<bool> playing = false;
+    std::atomic<bool> playing = false; // these two are the server's too, which goes before them
     std::atomic<int> unanswered = 0;
+    RawServer deaf;
     deaf.forwardTo(good.port(), [&](std::string bytes) {
         playing = playing || is(bytes, "PLAY");
         if (playing && (is(bytes, "GET_PARAMETER") || is(bytes, "OPTIONS"))) {

@@ -386,9 +386,9 @@ TEST_F(ReceiverSound, LoudestSamplesStayWithinOne) {
 TEST_F(ReceiverSound, SetsUpOnlyTheSoundByTheRequestsItSends) {
     const RtspServer server(
         {.launch = h264("width=320,height=240,framerate=30/1") + " " + tone(48000, 2) + payloader("L16", 1)});
-    RawServer proxy;
-    std::mutex mutex;
+    std::mutex mutex; // these two are the proxy's too, which goes before them
     std::string sent;
+    RawServer proxy;
     proxy.forwardTo(server.port(), [&](std::string bytes) {
         const std::lock_guard guard(mutex);
         sent += bytes;
@@ -547,8 +547,8 @@ struct Absurd {
 class AbsurdSound : public ReceiverSound, public testing::WithParamInterface<Absurd> {};
 
 TEST_P(AbsurdSound, IsRefusedWithALineBeforeAnythingIsSetUp) {
+    std::atomic<int> setups = 0; // the server's too, which goes before it
     RawServer server;
-    std::atomic<int> setups = 0;
     server.setScript([&](Connection& connection) {
         for (std::string request = connection.request(); !request.empty(); request = connection.request()) {
             if (request.rfind("DESCRIBE ", 0) == 0) {
