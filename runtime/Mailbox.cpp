@@ -13,33 +13,39 @@ void Mailbox::raiseStatus() {
     m_changed.notify_all();
 }
 
-void Mailbox::makeRoom() {
-    std::unique_ptr<Picture> late;
-    std::unique_ptr<Picture> before;
-    std::unique_ptr<Picture> replaced;
-    const std::lock_guard guard(m_mutex);
+bool Mailbox::fullLocked() const {
+    return m_waiting.size() + m_out.size() + m_ending + m_making > kPictures;
+}
+
+void Mailbox::makeRoom(Clock::duration patience) {
+    Pictures replaced;
+    std::unique_lock lock(m_mutex);
     ++m_making;
-    late = std::move(m_late);
-    const auto tooMany = [this] {
-        return m_out.size() + m_ending + (m_before ? 1 : 0) + (m_waiting ? 1 : 0) + m_making > kPictures;
-    };
-    if (tooMany()) {
-        before = std::move(m_before);
+    const auto worthWaiting = [this] { return !m_closed && fullLocked() && pictureReadyLocked() && m_pace.keepsUp(); };
+    if (worthWaiting()) {
+        const auto now = m_now();
+        const auto until = m_inside > 0 ? now + patience : std::min(now + patience, m_pace.looksBy());
+        for (auto left = until - now; left > left.zero() && worthWaiting(); left = until - m_now()) {
+            m_changed.wait_for(lock, left);
+        }
     }
-    if (tooMany()) {
-        replaced = std::move(m_waiting);
+    replaced.swap(m_late);
+    while (fullLocked() && !m_waiting.empty()) {
+        replaced.push_back(std::move(m_waiting.front()));
+        m_waiting.pop_front();
     }
 }
 
 void Mailbox::offer(std::unique_ptr<Picture> picture) {
+    std::deque<std::unique_ptr<Picture>> replaced;
     {
         const std::lock_guard guard(m_mutex);
         --m_making;
         if (!m_closed) {
-            std::swap(m_waiting, picture);
-            if (m_keepsUp && picture) {
-                std::swap(m_before, picture);
+            if (!m_pace.keepsUp()) {
+                replaced.swap(m_waiting);
             }
+            m_waiting.push_back(std::move(picture));
         }
     }
     m_changed.notify_all();
@@ -63,29 +69,30 @@ void Mailbox::offer(std::unique_ptr<Sound> sound) {
 }
 
 void Mailbox::dropWaiting() {
-    std::unique_ptr<Picture> late;
-    std::unique_ptr<Picture> before;
-    std::unique_ptr<Picture> dropped;
+    Pictures late;
+    std::deque<std::unique_ptr<Picture>> dropped;
     SoundQueue::Frames sounds;
-    const std::lock_guard guard(m_mutex);
-    late = std::move(m_late);
-    before = std::move(m_before);
-    dropped = std::move(m_waiting);
-    sounds = m_sounds.dropWaiting();
+    {
+        const std::lock_guard guard(m_mutex);
+        late.swap(m_late);
+        dropped.swap(m_waiting);
+        sounds = m_sounds.dropWaiting();
+    }
+    m_changed.notify_all();
 }
 
 bool Mailbox::pictureReadyLocked() const {
-    return m_waiting && m_out.size() + m_ending < kPicturesOut;
+    return !m_waiting.empty() && m_out.size() + m_ending < kPicturesOut;
 }
 
 /// A caller asks for pictures. What it is too late for is left to the maker, as it may take a while to end.
-void Mailbox::lookLocked(Clock::time_point now) {
-    if (!m_waiting) {
-        m_foundNone = now;
-    }
-    m_keepsUp = !m_waiting || (now - m_looked <= kLooksOften && now - m_foundNone <= kCatchesUp);
-    if (!m_keepsUp && m_before) {
-        m_late = std::move(m_before);
+void Mailbox::lookLocked() {
+    m_pace.looks(m_now(), !m_waiting.empty());
+    if (!m_pace.keepsUp()) {
+        for (; m_waiting.size() > 1; m_waiting.pop_front()) {
+            m_late.push_back(std::move(m_waiting.front()));
+        }
+        m_changed.notify_all(); // the maker may be waiting for this caller
     }
 }
 
@@ -97,16 +104,18 @@ int32_t Mailbox::capture(QIVOlib_video_frame_v2_t* video, QIVOlib_audio_frame_v2
     const auto ready = [&] { return readyLocked(video != nullptr, audio != nullptr); };
     std::unique_lock lock(m_mutex);
     if (video != nullptr) {
-        lookLocked(Clock::now());
+        lookLocked();
     }
-    const bool foundNone = !m_waiting;
+    const bool foundNone = m_waiting.empty();
     // A deadline that has passed is not even asked of the condition: that alone would give the processor away.
     if (!ready() && Clock::now() < deadline) {
+        const int caller = video != nullptr ? 1 : 0;
+        m_inside += caller;
         m_changed.wait_until(lock, deadline, ready);
+        m_inside -= caller;
     }
-    if (video != nullptr) {
-        m_looked = Clock::now();
-        m_foundNone = foundNone ? m_looked : m_foundNone;
+    if (video != nullptr && foundNone) {
+        m_pace.waited(m_now());
     }
     if (m_closed || !ready()) {
         return QIVOlib_frame_type_none;
@@ -116,7 +125,8 @@ int32_t Mailbox::capture(QIVOlib_video_frame_v2_t* video, QIVOlib_audio_frame_v2
         return QIVOlib_frame_type_status_change;
     }
     if (video != nullptr && pictureReadyLocked()) {
-        m_out.push_back(std::move(m_before ? m_before : m_waiting));
+        m_out.push_back(std::move(m_waiting.front()));
+        m_waiting.pop_front();
         *video = m_out.back()->record();
         return QIVOlib_frame_type_video;
     }
@@ -158,7 +168,7 @@ void Mailbox::giveSoundBack(const void* data) {
 
 QIVOlib_recv_queue_t Mailbox::waiting() const {
     const std::lock_guard guard(m_mutex);
-    return {(m_before ? 1 : 0) + (m_waiting ? 1 : 0), static_cast<int32_t>(m_sounds.waiting()), 0};
+    return {static_cast<int32_t>(m_waiting.size()), static_cast<int32_t>(m_sounds.waiting()), 0};
 }
 
 void Mailbox::close() {
@@ -170,15 +180,16 @@ void Mailbox::close() {
 }
 
 void Mailbox::drain() {
-    std::vector<std::unique_ptr<Picture>> ended;
+    Pictures late;
+    Pictures out;
+    std::deque<std::unique_ptr<Picture>> waiting;
     SoundQueue::Frames sounds;
     {
         const std::lock_guard guard(m_mutex);
         sounds = m_sounds.dropAll();
-        ended.swap(m_out);
-        ended.push_back(std::move(m_late));
-        ended.push_back(std::move(m_before));
-        ended.push_back(std::move(m_waiting));
+        late.swap(m_late);
+        out.swap(m_out);
+        waiting.swap(m_waiting);
     }
 }
 

@@ -24,6 +24,8 @@ namespace {
 /// held to this and loses packets in the jitter buffer instead of falling behind.
 constexpr GstClockTime kDecoderQueue = 200 * GST_MSECOND;
 constexpr guint kDecoderQueueUnits = 64;
+/// Up to this much of them the decoder waits for a caller who is about to take the pictures it has made.
+constexpr GstClockTime kWaitsForCaller = 150 * GST_MSECOND;
 /// Bytes that a source may send before a picture is complete, and before a unit of sound is.
 constexpr std::size_t kLargestUnit = 32U << 20U;
 constexpr std::size_t kLargestSoundUnit = 1U << 20U;
@@ -247,13 +249,11 @@ struct RtspSession::Callbacks {
     /// A picture is about to be converted.
     static GstPadProbeReturn makeRoom(GstPad*, GstPadProbeInfo*, gpointer data) {
         RtspSession& session = self(data);
-        if (session.m_muted) {
-            return GST_PAD_PROBE_DROP;
+        session.m_arrived = wallClock();
+        if (!session.m_muted && !session.m_making.exchange(true)) {
+            session.m_mailbox->makeRoom(session.decoderPatience());
         }
-        if (!session.m_making.exchange(true)) {
-            session.m_mailbox->makeRoom();
-        }
-        return GST_PAD_PROBE_OK;
+        return session.m_muted ? GST_PAD_PROBE_DROP : GST_PAD_PROBE_OK;
     }
 
     /// A picture has been converted.
@@ -261,8 +261,8 @@ struct RtspSession::Callbacks {
         RtspSession& session = self(data);
         GstBuffer* buffer = GST_PAD_PROBE_INFO_BUFFER(info);
         auto picture =
-            SamplePicture::map(sampleOf(pad, buffer), session.m_clock.at(GST_BUFFER_PTS(buffer)), wallClock());
-        if (picture && session.m_making.exchange(false)) {
+            SamplePicture::map(sampleOf(pad, buffer), session.m_clock.at(GST_BUFFER_PTS(buffer)), session.m_arrived);
+        if (picture && !session.m_muted && session.m_making.exchange(false)) {
             session.m_mailbox->offer(std::move(picture));
         }
         return GST_PAD_PROBE_OK;
@@ -444,7 +444,7 @@ bool RtspSession::addVideo(GstPad* pad, const std::string& encoding) {
         chain.push_back(makeElement(codec.parser));
         chain.push_back(makeFilter(parsed.get()));
     }
-    GstElement* queue = makeQueue();
+    GstElement* queue = m_decoderQueue = makeQueue();
     GstElement* bounded = makeFilter(decoded.get());
     GstElement* converter = makeConverter();
     GstElement* sink = makeSink();
@@ -457,6 +457,13 @@ bool RtspSession::addVideo(GstPad* pad, const std::string& encoding) {
         watchInput(sink, GST_PAD_PROBE_TYPE_BUFFER, Callbacks::handOn, this);
     }
     return appendChain(GST_BIN(m_pipeline.get()), pad, chain);
+}
+
+/// How long the decoder may wait without packets being lost before it, as long as they come no faster than usual.
+std::chrono::nanoseconds RtspSession::decoderPatience() const {
+    guint64 waiting = 0;
+    g_object_get(m_decoderQueue, "current-level-time", &waiting, nullptr);
+    return std::chrono::nanoseconds(kWaitsForCaller - std::min<guint64>(waiting, kWaitsForCaller));
 }
 
 /// Makes one whole picture of each pair of fields, without waiting for later ones. Progressive streams, which most are,

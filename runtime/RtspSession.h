@@ -91,6 +91,7 @@ class RtspSession {
     void unitComplete();
     void addBranch(GstPad* pad);
     bool addVideo(GstPad* pad, const std::string& encoding);
+    std::chrono::nanoseconds decoderPatience() const;
     void deinterlace(GstPad* decoded, GstCaps* caps);
     bool addAudio(GstPad* pad, const std::string& encoding);
     void addSink(GstPad* pad);
@@ -101,7 +102,8 @@ class RtspSession {
     SenderClock m_clock;                  // outlives the pipeline and the sound
     std::unique_ptr<SoundBranch> m_sound; // built by the source's thread; outlives the pipeline that calls it
     GstOwned<GstElement> m_pipeline;
-    GstElement* m_source = nullptr; // the pipeline's
+    GstElement* m_source = nullptr;       // the pipeline's, as is the next
+    GstElement* m_decoderQueue = nullptr; // before the decoder; set before there is a thread behind it
 
     std::atomic<bool> m_ending = false; // the destructor has begun
     std::atomic<bool> m_muted = false;
@@ -109,6 +111,7 @@ class RtspSession {
     std::atomic<bool> m_described = false; // the server has described its streams
     std::atomic<bool> m_linked = false;    // the chosen stream's branch has been built
     std::atomic<bool> m_making = false;    // the mailbox expects a picture; the decoder's thread
+    std::int64_t m_arrived = 0;            // when the picture that is being made was there; the decoder's thread
     bool m_deinterlacing = false;          // from the first interlaced picture on; the decoder's thread
     std::atomic<int> m_requests = 0;       // sent before the server agreed; counted on the source's thread
     int m_setups = 0;                      // those of them that set a stream up; the source's thread

@@ -187,9 +187,9 @@ QIVOLIB_API QIVOlib_recv_instance_t QIVOlib_recv_create_v3(const QIVOlib_recv_cr
 /** Ends a receiver. */
 QIVOLIB_API void QIVOlib_recv_destroy(QIVOlib_recv_instance_t p_instance);
 
-/** Takes what came next, of the kinds whose record is not null: a status change first, then the newest video frame or
- *  the oldest audio frame. Who keeps up with a source gets the video frame before the newest too, and first. Waits at
- *  most timeout_in_ms. Returns a QIVOlib_frame_type; only the record of that type is filled. */
+/** Takes what came next, of the kinds whose record is not null: a status change first, then a video frame or the
+ *  oldest audio frame. Who keeps up with a source gets its video frames one after the other, anybody else the newest.
+ *  Waits at most timeout_in_ms. Returns a QIVOlib_frame_type; only the record of that type is filled. */
 QIVOLIB_API int32_t QIVOlib_recv_capture_v2(QIVOlib_recv_instance_t p_instance, QIVOlib_video_frame_v2_t* p_video,
                                             QIVOlib_audio_frame_v2_t* p_audio, QIVOlib_metadata_frame_t* p_metadata,
                                             uint32_t timeout_in_ms);

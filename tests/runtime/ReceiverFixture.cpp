@@ -103,6 +103,15 @@ Shot ReceiverFixture::nextPicture(Receiver& receiver, std::chrono::milliseconds 
         receiver, [](const Shot&) { return true; }, limit);
 }
 
+Shot ReceiverFixture::waitingPicture(Receiver& receiver) {
+    QIVOlib_video_frame_v2_t record{};
+    int32_t type = QIVOlib_frame_type_none;
+    while ((type = receiver.capture(&record, nullptr, nullptr, 0ms)) == QIVOlib_frame_type_status_change) {
+        ++m_statusChanges;
+    }
+    return type == QIVOlib_frame_type_video ? Shot(receiver, record) : Shot();
+}
+
 Shot ReceiverFixture::pictureThat(Receiver& receiver, const std::function<bool(const Shot&)>& wanted,
                                   std::chrono::milliseconds limit) {
     const auto deadline = Clock::now() + limit;

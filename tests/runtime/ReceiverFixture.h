@@ -73,6 +73,8 @@ class ReceiverFixture : public testing::Test {
 
     /// The next picture; status changes before it are counted in `statusChanges`.
     Shot nextPicture(runtime::Receiver& receiver, std::chrono::milliseconds limit = 8s);
+    /// The next picture if one waits already; status changes before it are counted too.
+    Shot waitingPicture(runtime::Receiver& receiver);
     /// The first picture for which `wanted` is true.
     Shot pictureThat(runtime::Receiver& receiver, const std::function<bool(const Shot&)>& wanted,
                      std::chrono::milliseconds limit = 8s);

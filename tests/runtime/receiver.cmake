@@ -17,7 +17,7 @@ qivo_test(sound-parts SOURCES ChannelOrderTest.cpp SoundQueueTest.cpp LIBRARIES 
 qivo_test(receiver-sound SOURCES ReceiverSoundTest.cpp LIBRARIES qivo_receiver_fixture qivo_test_tone NETWORK BUSY
           SHARES 3 ENVIRONMENT ${unwind} TIMEOUT 120)
 qivo_test(picture-converter SOURCES PictureConverterTest.cpp LIBRARIES qivo_runtime ENVIRONMENT ${unwind})
-qivo_test(receiver-parts SOURCES ReceiverPartsTest.cpp LIBRARIES qivo_runtime TSAN)
+qivo_test(receiver-parts SOURCES CallerPaceTest.cpp MailboxTest.cpp ReceiverPartsTest.cpp LIBRARIES qivo_runtime TSAN)
 
 # Through the library itself, which brings its own copy of everything that it is made of.
 if(NOT QIVO_SANITIZE STREQUAL "thread")
