@@ -327,6 +327,7 @@ void printRatios(const std::vector<Result>& results) {
 } // namespace
 
 int main(int argc, char** argv) {
+    std::setvbuf(stdout, nullptr, _IOLBF, 0); // a round takes minutes, also where a file takes the output
     const seconds duration(argc > 1 ? std::max(1, std::atoi(argv[1])) : 20);
     const int rounds = argc > 2 ? std::max(1, std::atoi(argv[2])) : 1;
     const auto screen = Screen::open();
