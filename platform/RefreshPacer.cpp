@@ -20,7 +20,7 @@ void RefreshPacer::setPeriod(Duration period) {
 void RefreshPacer::restart() {
     m_pacedByClock = false;
     m_begun = false;
-    m_due = Time{};
+    m_due = m_paused = Time{};
 }
 
 void RefreshPacer::begin(Time now) {
@@ -29,6 +29,12 @@ void RefreshPacer::begin(Time now) {
     }
     if (m_pacedByClock) {
         followClock(now);
+    }
+}
+
+void RefreshPacer::end(Time now) {
+    if (m_pacedByClock) {
+        m_paused = now + m_period / kPause;
     }
 }
 

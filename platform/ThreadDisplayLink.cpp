@@ -67,6 +67,7 @@ void ThreadDisplayLink::run() {
         const auto now = std::chrono::steady_clock::now();
         pacer.begin(now);
         m_callback(this, TimeStamp{now}, m_context);
+        pacer.end(std::chrono::steady_clock::now());
     }
 }
 

@@ -7,7 +7,9 @@
 #include <ctime>
 #include <functional>
 #include <gtest/gtest.h>
+#include <optional>
 #include <thread>
+#include <vector>
 
 namespace qivo::test {
 namespace {
@@ -129,6 +131,28 @@ TEST_F(DisplayLinkTest, StopsWhileACallbackWaitsForTheContextsLock) {
     EXPECT_EQ(left, entered);
     releaser.join();
     holder.join();
+}
+
+TEST_F(DisplayLinkTest, LongCallbacksLeaveAPause) {
+    std::vector<std::chrono::nanoseconds> pauses;
+    std::optional<std::chrono::steady_clock::time_point> ended;
+    const auto period = RefreshPacer::periodOfRate(display.refresh->rate);
+    work = [&, number = 0]() mutable {
+        if (ended) {
+            pauses.push_back(std::chrono::steady_clock::now() - *ended);
+        }
+        const bool fits = ++number <= 50; // the link is certain of the clock then
+        std::this_thread::sleep_for(fits ? 0ns : 2 * period);
+        ended = fits ? std::nullopt : std::optional(std::chrono::steady_clock::now());
+    };
+    const int before = left;
+    link.start();
+    ASSERT_TRUE(waitUntil([&] { return left > before + 60; }));
+    link.stop();
+    ASSERT_GT(pauses.size(), 5U);
+    for (const auto pause : pauses) {
+        EXPECT_GE(pause, period / RefreshPacer::kPause);
+    }
 }
 
 TEST_F(DisplayLinkTest, AWaitForTheNextRefreshIsCutShortByStop) {

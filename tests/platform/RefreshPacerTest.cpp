@@ -12,6 +12,7 @@ using Time = RefreshPacer::Time;
 using Duration = RefreshPacer::Duration;
 
 constexpr Duration kPeriod = 16'666'667ns;
+constexpr Duration kPause = kPeriod / RefreshPacer::kPause;
 const Time kStart{1000s};
 
 /// Runs passes as a refresh thread does, on a clock of the test's own.
@@ -25,6 +26,7 @@ class Loop {
         const Time begun = now;
         pacer.begin(now);
         now += takes;
+        pacer.end(now);
         return begun;
     }
 
@@ -120,7 +122,7 @@ TEST(RefreshPacerTest, ALatePassKeepsTheGrid) {
     loop.settleOnClock();
     const Time first = loop.pass(100us);
     loop.pass(kPeriod + 5ms);
-    EXPECT_EQ(loop.pass(100us) - first, 2 * kPeriod + 5ms);
+    EXPECT_EQ(loop.pass(100us) - first, 2 * kPeriod + 5ms + kPause);
     EXPECT_EQ(loop.pass(100us) - first, 3 * kPeriod);
 }
 
@@ -150,14 +152,41 @@ TEST(RefreshPacerTest, NoBurstAfterAStallWhileSwapsWait) {
     EXPECT_LE(passes, 60 + RefreshPacer::kSwapQueue + 2);
 }
 
-TEST(RefreshPacerTest, WorkLongerThanAPeriodRunsBackToBack) {
-    Loop loop;
-    Time last = loop.pass(20ms);
+/// Passes that take long, and how far apart they begin.
+void runLongPasses(Loop& loop, Duration takes, Duration apart) {
+    Time last = loop.pass(takes);
     for (int i = 0; i < 100; ++i) {
-        const Time begun = loop.pass(20ms);
-        EXPECT_EQ(begun - last, 20ms);
+        const Time begun = loop.pass(takes);
+        ASSERT_EQ(begun - last, apart);
         last = begun;
     }
+}
+
+TEST(RefreshPacerTest, WorkLongerThanAPeriodRunsBackToBackWhereSwapsMayWait) {
+    Loop loop;
+    runLongPasses(loop, 20ms, 20ms);
+    EXPECT_FALSE(loop.pacer.pacedByClock());
+}
+
+TEST(RefreshPacerTest, WorkLongerThanAPeriodLeavesAPauseWhereTheClockPaces) {
+    Loop loop;
+    loop.settleOnClock();
+    runLongPasses(loop, 20ms, 20ms + kPause);
+}
+
+TEST(RefreshPacerTest, WorkThatFitsIsNotSlowedDownByThePause) {
+    Loop loop;
+    loop.settleOnClock();
+    loop.pass(100us);
+    runLongPasses(loop, kPeriod - kPause, kPeriod);
+}
+
+TEST(RefreshPacerTest, APauseEndsWithARestart) {
+    Loop loop;
+    loop.settleOnClock();
+    loop.pass(20ms);
+    loop.pacer.restart();
+    EXPECT_LE(loop.pacer.due(), loop.now);
 }
 
 TEST(RefreshPacerTest, AfterARestartItLooksAfresh) {
